@@ -1,0 +1,196 @@
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <vector>
+
+#include "QRLBlobDB.h"
+#include "VXEngine.h"
+#include "VXException.h"
+#include "VXResult.h"
+#include "vxcatalog.h"
+#include "vxtest.h"
+
+namespace {
+
+using Sel = CQRLBlobDB::SSelector;
+
+// The catalog logs through an engine; the engine itself stays closed in these tests.
+class CatalogTest : public ::testing::Test {
+ protected:
+  void SetUp() override { engine_.SetLogFile(&log_); }
+  CVXCatalog& Catalog() { return engine_.Catalog(); }
+  std::string Path() const { return dir_ / "db.vxc"; }
+
+  // Opens the closed catalog's store directly to look at or tamper with its records.
+  template <typename F>
+  void WithStore(F f) {
+    CQRLBlobDB db;
+    ASSERT_EQ(db.Open(Path(), false), VX_OK);
+    f(db);
+    ASSERT_EQ(db.Close(), VX_OK);
+  }
+
+  static std::vector<uint8_t> Record(CQRLBlobDB& db, Sel sel) {
+    unsigned size = 0;
+    EXPECT_EQ(db.GetSize(sel, size), VX_OK);
+    std::vector<uint8_t> bytes(size);
+    EXPECT_EQ(db.Get(sel, bytes.data(), size), VX_OK);
+    return bytes;
+  }
+
+  unsigned OpenCode(bool readOnly = false) {
+    try {
+      Catalog().Reset();
+      Catalog().Open(Path(), readOnly);
+    } catch (CVXException* e) {
+      unsigned code = e->GetCode();
+      delete e;
+      return code;
+    }
+    return VX_OK;
+  }
+
+  vxtest::TempDir dir_;
+  vxtest::CapturedLog log_;
+  CVXEngine engine_;
+};
+
+TEST_F(CatalogTest, CreateWritesBothHeaderCopiesAndTheSuperCategory) {
+  Catalog().Create(Path());
+  EXPECT_TRUE(log_.HasLine("  Super Category created"));
+  Catalog().Close();
+
+  std::vector<uint8_t> want(278, 0);
+  std::memcpy(want.data(), "VXCF", 4);
+  want[4] = 0x00;
+  want[5] = 0x03;  // 768, little-endian
+  WithStore([&](CQRLBlobDB& db) {
+    EXPECT_EQ(Record(db, Sel(1, 1)), want);
+    EXPECT_EQ(Record(db, Sel(21, 1)), want);
+    ASSERT_TRUE(db.HasRecord(Sel(4, VX_ALL_GROUP_OID)));
+  });
+
+  ASSERT_EQ(OpenCode(), VX_OK);
+  ASSERT_EQ(Catalog().Groups().count(VX_ALL_GROUP_OID), 1u);
+  const CVXGroup& all = Catalog().Groups().at(VX_ALL_GROUP_OID);
+  EXPECT_EQ(all.Name(), "@All");
+  EXPECT_EQ(all.Description(), "This category virtually contains ALL images in your database.");
+  EXPECT_EQ(all.Parent(), 0u);
+}
+
+TEST_F(CatalogTest, OidsStartAtOneAndKeepRisingAcrossReopen) {
+  Catalog().Create(Path());
+  EXPECT_EQ(Catalog().GenerateFileOID(), 1u);
+  EXPECT_EQ(Catalog().GenerateFolderOID(), 1u);
+  EXPECT_EQ(Catalog().GenerateGroupOID(), 1u);
+  EXPECT_EQ(Catalog().GeneratePersistantSelectionOID(), 1u);
+  EXPECT_EQ(Catalog().GenerateFileOID(), 2u);
+  Catalog().Close();
+  for (uint32_t round = 0; round < 3; ++round) {
+    ASSERT_EQ(OpenCode(), VX_OK);
+    EXPECT_EQ(Catalog().GenerateFileOID(), 3u + round);
+    EXPECT_EQ(Catalog().GenerateGroupOID(), 2u + round);
+    Catalog().Close();
+  }
+}
+
+TEST_F(CatalogTest, DamagedMainHeaderFallsBackToCopy) {
+  Catalog().Create(Path());
+  for (int i = 0; i < 5; ++i) Catalog().GenerateFileOID();
+  Catalog().Close();
+  WithStore([](CQRLBlobDB& db) { ASSERT_EQ(db.Set(Sel(1, 1), "junk", 4), VX_OK); });
+  log_.ClearCaptured();
+  ASSERT_EQ(OpenCode(), VX_OK);
+  EXPECT_TRUE(log_.Has("Failed to load original header. Reverting to backup copy!"));
+  EXPECT_FALSE(log_.Has("BOTH copies"));
+  EXPECT_EQ(Catalog().Header().LastFileOid, 5u);
+  EXPECT_EQ(Catalog().GenerateFileOID(), 6u);
+}
+
+TEST_F(CatalogTest, BothHeadersLostAreRebuiltFromContent) {
+  Catalog().Create(Path());
+  for (int i = 0; i < 3; ++i) Catalog().GenerateGroupOID();
+  Catalog().GeneratePersistantSelectionOID();
+  Catalog().Close();
+  WithStore([](CQRLBlobDB& db) {
+    for (uint32_t oid : {1u, 2u, 7u}) ASSERT_EQ(db.Set(Sel(3, oid), "f", 1), VX_OK);
+    ASSERT_EQ(db.Set(Sel(2, 4), "d", 1), VX_OK);
+    ASSERT_EQ(db.Remove(Sel(1, 1)), VX_OK);
+    ASSERT_EQ(db.Set(Sel(21, 1), "xx", 2), VX_OK);
+  });
+  log_.ClearCaptured();
+  ASSERT_EQ(OpenCode(), VX_OK);
+  EXPECT_TRUE(log_.Has("BOTH copies of the database header are damage."));
+  EXPECT_TRUE(log_.Has("RESTORING damaged header information from database contents: "));
+  EXPECT_TRUE(log_.HasLine("  Next file OID: 8"));
+  // Restored counters are the highest OID plus 1; generating adds 1 again. The super category
+  // never raises the group counter, and the selection counter restarts.
+  EXPECT_EQ(Catalog().GenerateFileOID(), 9u);
+  EXPECT_EQ(Catalog().GenerateFolderOID(), 6u);
+  EXPECT_EQ(Catalog().GenerateGroupOID(), 2u);
+  EXPECT_EQ(Catalog().GeneratePersistantSelectionOID(), 1u);
+  Catalog().Close();
+  // The recovered header was stored: a plain reopen keeps the counters.
+  ASSERT_EQ(OpenCode(), VX_OK);
+  EXPECT_EQ(Catalog().Header().LastFileOid, 9u);
+}
+
+TEST_F(CatalogTest, SecondOpenerAndBadFilesGiveCodes) {
+  Catalog().Create(Path());
+  CVXCatalog other;
+  try {
+    other.Open(Path(), false);
+    FAIL() << "a held catalog opened twice";
+  } catch (CVXException* e) {
+    EXPECT_EQ(e->GetCode(), VX_SHARING_VIOLATION);
+    delete e;
+  }
+  Catalog().Close();
+
+  for (const std::string& bytes :
+       {std::string(), std::string("not a store at all"), std::string(5000, '\xAB')}) {
+    vxtest::WriteFile(Path(), bytes);
+    log_.ClearCaptured();
+    EXPECT_NE(OpenCode(), VX_OK);
+    EXPECT_TRUE(log_.Has("Error opening files database. Potential database corruption."));
+    EXPECT_EQ(vxtest::ReadFile(Path()), bytes) << "a failed open changed the file";
+  }
+}
+
+TEST_F(CatalogTest, CorruptCategoryRecordFailsTheOpen) {
+  Catalog().Create(Path());
+  Catalog().Close();
+  WithStore([](CQRLBlobDB& db) { ASSERT_EQ(db.Set(Sel(4, 9), "\x01\x00", 2), VX_OK); });
+  EXPECT_EQ(OpenCode(), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Loading groups"));
+}
+
+TEST_F(CatalogTest, OpenSendsLoadMessagesToTheEngine) {
+  Catalog().Create(Path());
+  Catalog().Close();
+  struct Seen {
+    std::vector<std::pair<unsigned, unsigned long>> messages;
+  } seen;
+  // The engine forwards catalog notifications only while its own Open runs; drive it through a
+  // full engine open to see them.
+  vxtest::TempDir dir;
+  SVXCreateInfo info;
+  info.Name = dir / "e.vxm";
+  CVXEngine engine;
+  ASSERT_EQ(engine.Create(info), VX_OK);
+  ASSERT_EQ(engine.Close(), VX_OK);
+  auto cb = [](ECBMessage m, void* user, unsigned long a, unsigned long, const char*) {
+    static_cast<Seen*>(user)->messages.emplace_back(m, a);
+  };
+  ASSERT_EQ(engine.Open(info, cb, &seen), VX_OK);
+  // Groups: begin, 0 %, 100 % after the one category, the closing 100 %, stage end; then the
+  // catalog's own end of loading.
+  std::vector<std::pair<unsigned, unsigned long>> want = {{5002, 0},   {5003, 0}, {5003, 100},
+                                                          {5003, 100}, {5004, 0}, {5004, 0}};
+  EXPECT_EQ(seen.messages, want);
+  seen.messages.clear();
+  engine.Catalog().Notify(5003, 1, 0, nullptr);
+  EXPECT_TRUE(seen.messages.empty()) << "the callback outlived Open";
+}
+
+}  // namespace

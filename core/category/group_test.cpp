@@ -1,0 +1,165 @@
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "VXException.h"
+#include "VXGroup.h"
+#include "VXMemFile.h"
+#include "VXResult.h"
+
+namespace {
+
+// Little-endian byte builder for hand-made records.
+struct Bytes {
+  std::vector<uint8_t> b;
+  Bytes& u16(uint16_t v) { return raw(&v, 2); }
+  Bytes& u32(uint32_t v) { return raw(&v, 4); }
+  Bytes& str(const std::string& s) {
+    u32(static_cast<uint32_t>(s.size()));
+    return raw(s.data(), s.size());
+  }
+  Bytes& raw(const void* p, size_t n) {
+    auto* c = static_cast<const uint8_t*>(p);
+    b.insert(b.end(), c, c + n);
+    return *this;
+  }
+};
+
+std::vector<uint8_t> Serialise(const CVXGroup& g) {
+  CVXMemFile file;
+  file << g;
+  return {file.GetBuffer(), file.GetBuffer() + file.GetFileSize()};
+}
+
+CVXGroup Deserialise(const std::vector<uint8_t>& bytes) {
+  CVXMemFile file(bytes.data(), bytes.size());
+  CVXGroup g;
+  file >> g;
+  return g;
+}
+
+unsigned CodeOf(const std::vector<uint8_t>& bytes, CVXGroup& g) {
+  CVXMemFile file(bytes.data(), bytes.size());
+  try {
+    file >> g;
+  } catch (CVXException* e) {
+    unsigned code = e->GetCode();
+    delete e;
+    return code;
+  }
+  return VX_OK;
+}
+
+TEST(GroupRecord, CurrentVersionMatchesHandBuiltBytes) {
+  CVXGroup g(0xFFFFEFFF);
+  g.Name() = "@All";
+  g.Description() = "all";
+  g.Images().Set(3);
+  g.Children() = {7, 9};
+  g.Flags() = 96;
+  g.SortSequence() = -2;
+  g.LastActiveOid() = 5;
+  SExpr e;
+  e.Type = 2;
+  e.Oid = 7;
+  e.Flags = 1;
+  g.Postfix().push_back(e);
+
+  Bytes want;
+  want.u16(1).u32(0xFFFFEFFF).u16(7).u32(0);
+  want.u32(0xFFEEFFAA).u16(4).u32(1).u32(2).u32(7).str("").str("").str("").u32(1).str("");
+  want.u32(0xFFEEFFAA).u16(4).u32(0);
+  want.str("@All").str("all");
+  // Images: Set(3) grows the set to 36 bits, stored as two 32-bit words.
+  want.u32(8).u32(1u << 3).u32(0);
+  want.u32(2).u32(7).u32(9);
+  want.str("").u32(96).u32(0).u32(0xFFFFFFFE).str("").str("").u32(0).u32(0).u32(0).u32(5);
+  EXPECT_EQ(Serialise(g), want.b);
+
+  CVXGroup back = Deserialise(want.b);
+  EXPECT_EQ(back.Oid(), 0xFFFFEFFFu);
+  EXPECT_EQ(back.Name(), "@All");
+  EXPECT_EQ(back.Children(), (std::vector<uint32_t>{7, 9}));
+  EXPECT_TRUE(back.Images().Get(3));
+  EXPECT_EQ(back.Images().Count(), 1u);
+  EXPECT_EQ(back.Postfix(), g.Postfix());
+  EXPECT_EQ(back.SortSequence(), -2);
+  EXPECT_EQ(back.LastActiveOid(), 5u);
+  EXPECT_TRUE(back.IsSystem());
+  EXPECT_TRUE(back.IsSealed());
+}
+
+TEST(GroupRecord, OlderVersionsReadWithDefaults) {
+  // Version 1: old-form lists (count, then type, OID, text) and no fields after the shortcut.
+  Bytes v1;
+  v1.u16(1).u32(12).u16(1).u32(3);
+  v1.u32(1).u32(2).u32(8).str("");   // postfix: one category element
+  v1.u32(1).u32(2).u32(8).str("x");  // infix
+  v1.str("old").str("d").u32(0).u32(0).str("k");
+  CVXGroup g = Deserialise(v1.b);
+  EXPECT_EQ(g.Oid(), 12u);
+  EXPECT_EQ(g.Parent(), 3u);
+  ASSERT_EQ(g.Postfix().size(), 1u);
+  EXPECT_EQ(g.Postfix()[0].Oid, 8u);
+  EXPECT_EQ(g.Infix()[0].Text, "x");
+  EXPECT_EQ(g.Shortcut(), "k");
+  EXPECT_EQ(g.Flags(), 0u);
+  EXPECT_EQ(g.SortSequence(), -1);
+  EXPECT_TRUE(g.FTITag().empty());
+
+  // Version 4 with list version 1 (no marker: the first word is the count), no flags or labels
+  // in the elements; FTI fields and the last active OID absent.
+  Bytes v4;
+  v4.u16(1).u32(13).u16(4).u32(0);
+  v4.u32(1).u32(4).u32(21).str("").str("VOL").str("SER");
+  v4.u32(0);
+  v4.str("n").str("").u32(0).u32(0).str("").u32(16).u32(0xFF).u32(3);
+  g = Deserialise(v4.b);
+  ASSERT_EQ(g.Postfix().size(), 1u);
+  EXPECT_EQ(g.Postfix()[0].MediaID, "VOL");
+  EXPECT_EQ(g.Postfix()[0].Flags, 0u);
+  EXPECT_EQ(g.Flags(), 16u);
+  EXPECT_EQ(g.Color(), 0xFFu);
+  EXPECT_EQ(g.SortSequence(), 3);
+  EXPECT_EQ(g.FTISubStrLen(), 0);
+}
+
+TEST(GroupRecord, TruncatedOrCorruptRecordsGiveCodeAndLeaveObjectAlone) {
+  CVXGroup g(5);
+  g.Name() = "keep";
+  g.Postfix().resize(2);
+  g.Images().Set(100);
+  std::vector<uint8_t> good = Serialise(g);
+  CVXGroup target(77);
+  target.Name() = "before";
+  for (size_t n = 0; n < good.size(); ++n) {
+    std::vector<uint8_t> cut(good.begin(), good.begin() + n);
+    ASSERT_EQ(CodeOf(cut, target), VX_NOT_FOUND) << "length " << n;
+    ASSERT_EQ(target.Name(), "before");
+    ASSERT_EQ(target.Oid(), 77u);
+  }
+  // An element count that claims far more than the record holds is refused before allocating.
+  Bytes huge;
+  huge.u16(1).u32(1).u16(7).u32(0).u32(0xFFEEFFAA).u16(4).u32(0x7FFFFFFF);
+  EXPECT_EQ(CodeOf(huge.b, target), VX_NOT_FOUND);
+  EXPECT_EQ(CodeOf(good, target), VX_OK);
+  EXPECT_EQ(target.Name(), "keep");
+}
+
+TEST(GroupObject, FlagAndChildTests) {
+  CVXGroup g(3);
+  g.FTITag() = "dc:subject";
+  EXPECT_TRUE(g.IsFTIRoot());
+  EXPECT_FALSE(g.IsFTIChild());
+  g.FTIPattern() = "red";
+  EXPECT_TRUE(g.IsFTIChild());
+  g.Children() = {4, 5};
+  EXPECT_TRUE(g.IsChildGroup(5));
+  EXPECT_FALSE(g.IsChildGroup(6));
+  g.Flags() = gfNeedsRecalc;
+  EXPECT_TRUE(g.NeedsRecalc());
+}
+
+}  // namespace

@@ -1,0 +1,18 @@
+#!/usr/bin/env bash
+# Installs what building and testing vxcore3 needs on Debian 12. Safe to run again.
+set -euo pipefail
+packages=(
+  ca-certificates cmake ninja-build g++ clang libclang-rt-14-dev pkg-config
+  libsqlite3-dev libre2-dev libicu-dev libgtest-dev libgmock-dev libbenchmark-dev
+)
+missing=()
+for p in "${packages[@]}"; do
+  dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
+done
+if [ ${#missing[@]} -gt 0 ]; then
+  SUDO=""
+  [ "$(id -u)" -ne 0 ] && SUDO="sudo"
+  export DEBIAN_FRONTEND=noninteractive
+  $SUDO apt-get update -qq
+  $SUDO apt-get install -y -qq --no-install-recommends "${missing[@]}"
+fi
