@@ -8,8 +8,12 @@
 #include <string>
 #include <vector>
 
+#include <stdexcept>
+
 #include "QRLBlobDB.h"
 #include "VXEngine.h"
+#include "VXException.h"
+#include "VXLog.h"
 #include "VXResult.h"
 #include "vxtest.h"
 
@@ -276,6 +280,29 @@ TEST_F(EngineTest, OidsKeepRisingAcrossCloseAndOpen) {
     ASSERT_EQ(engine_.Open(info_), VX_OK);
   }
   EXPECT_EQ(last, 12u);
+}
+
+}  // namespace
+
+namespace {
+
+// The public edge turns every kind of exception into a code.
+TEST(ExceptionEdge, EveryExceptionBecomesACode) {
+  vxtest::CapturedLog log;
+  auto codeOf = [&](auto thrower) {
+    try {
+      thrower();
+    } catch (...) {
+      return VXCodeOfCurrentException(&log, __LINE__, __FILE__);
+    }
+    return 0u;
+  };
+  EXPECT_EQ(codeOf([] { VX_THROW(VX_SHARING_VIOLATION); }), VX_SHARING_VIOLATION);
+  EXPECT_EQ(codeOf([] { throw std::runtime_error("framework"); }), VX_FRAMEWORK_EXCEPTION);
+  EXPECT_EQ(codeOf([] { throw 42; }), VX_UNKNOWN_EXCEPTION);
+  EXPECT_TRUE(log.Has("10211"));
+  EXPECT_TRUE(log.Has("framework"));
+  EXPECT_TRUE(log.HasLine("..."));
 }
 
 }  // namespace
