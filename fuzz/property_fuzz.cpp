@@ -58,7 +58,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   {
     CVXMemFile in(data, size);
     std::vector<CVXProperty> values;
-    while (Reads([&] { values.emplace_back(); in >> values.back(); })) {
+    while (Reads([&] {
+      values.emplace_back();
+      in >> values.back();
+    })) {
     }
     values.pop_back();
     CheckRoundTrip(values);

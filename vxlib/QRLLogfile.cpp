@@ -128,7 +128,11 @@ bool CQRLLogfile::AddError(const char* text, int line, const char* file) {
 
 bool CQRLLogfile::AddError(const CVXException* e, int line, const char* file) {
   if (!e) return AddError("unknown exception", line, file);
-  return AddError(e->GetCode(), e->GetErrorMessage().c_str(), line, file);
+  // The default message already starts with "Error <code>"; a custom one gets the code added.
+  std::string text = e->GetErrorMessage();
+  std::string prefix = "Error " + std::to_string(e->GetCode());
+  if (text.compare(0, prefix.size(), prefix) != 0) text = prefix + ": " + text;
+  return Write_('E', 1, line, file, text);
 }
 
 bool CQRLLogfile::AddError(const std::exception& e, int line, const char* file) {

@@ -17,6 +17,7 @@ class CVXException : public CVXBase {
   unsigned long GetExtra() const { return extra_; }
   const char* GetFile() const { return file_.c_str(); }
   int GetLine() const { return line_; }
+  int GetFlag() const { return flag_; }
   // "Error 10020 (record or object not found) at VXMemFile.cpp:42", or the text given with
   // SetErrorMessage.
   std::string GetErrorMessage() const;

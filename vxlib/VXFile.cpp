@@ -2,6 +2,8 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
+
 #include "VXException.h"
 #include "VXResult.h"
 
@@ -34,11 +36,23 @@ CVXFile& CVXFile::operator<<(const std::string& text) {
 CVXFile& CVXFile::operator>>(std::string& text) {
   uint32_t size = 0;
   *this >> size;
-  if (size > Remaining()) VX_THROW(VX_NOT_FOUND);
-  std::string value(size, '\0');
-  Read(value.data(), size);
-  text = std::move(value);
+  std::vector<uint8_t> bytes = ReadBytes(size);
+  text.assign(bytes.begin(), bytes.end());
   return *this;
+}
+
+std::vector<uint8_t> CVXFile::ReadBytes(uint32_t size) {
+  if (size > Remaining()) VX_THROW(VX_NOT_FOUND);
+  std::vector<uint8_t> bytes;
+  constexpr size_t kChunk = 1 << 20;
+  for (uint32_t left = size; left > 0;) {
+    size_t n = std::min<size_t>(left, kChunk);
+    size_t at = bytes.size();
+    bytes.resize(at + n);
+    Read(bytes.data() + at, n);
+    left -= static_cast<uint32_t>(n);
+  }
+  return bytes;
 }
 
 void CVXFile::BeginCheckSum() {

@@ -6,6 +6,7 @@
 #include <cstring>
 #include <string>
 #include <type_traits>
+#include <vector>
 
 #include "VXBase.h"
 
@@ -48,18 +49,24 @@ class CVXFile : public CVXBase {
   CVXFile& operator<<(const CBitVector& bits);
   CVXFile& operator>>(CBitVector& bits);
 
+  // Exactly `size` bytes, or throws 10020. A count beyond Remaining() fails before anything is
+  // read, and an unknown remainder is read in chunks, so a corrupt count cannot make the reader
+  // allocate far more than the input holds.
+  std::vector<uint8_t> ReadBytes(uint32_t size);
+
   void BeginCheckSum();
   uint32_t EndCheckSum();
 
   static bool FileExists(const std::string& path);
 
+  // Bytes still readable, or UINT64_MAX when unknown; lets readers reject a count or length
+  // field that claims more than the input holds before they allocate for it.
+  virtual uint64_t Remaining() const { return UINT64_MAX; }
+
  protected:
   // Raw transfer. ReadRaw must deliver exactly `size` bytes or throw.
   virtual void WriteRaw(const void* buffer, size_t size) = 0;
   virtual void ReadRaw(void* buffer, size_t size) = 0;
-  // Bytes still readable, or SIZE_MAX when unknown; lets readers reject a length field that
-  // claims more than the input holds before they allocate for it.
-  virtual uint64_t Remaining() const { return UINT64_MAX; }
 
  private:
   void Sum_(const void* buffer, size_t size);

@@ -60,17 +60,8 @@ CVXFile& operator<<(CVXFile& file, const CVXMemFile& mem) {
 CVXFile& operator>>(CVXFile& file, CVXMemFile& mem) {
   uint32_t size = 0;
   file >> size;
-  // Read into a temporary, in chunks, so that a corrupt length neither leaves `mem` half
-  // changed nor makes us allocate gigabytes before the read fails.
-  std::vector<uint8_t> bytes;
-  constexpr size_t kChunk = 1 << 20;
-  for (uint32_t left = size; left > 0;) {
-    size_t n = std::min<size_t>(left, kChunk);
-    size_t at = bytes.size();
-    bytes.resize(at + n);
-    file.Read(bytes.data() + at, n);
-    left -= static_cast<uint32_t>(n);
-  }
+  // Read fully before touching `mem`, so that a corrupt length leaves it as it was.
+  std::vector<uint8_t> bytes = file.ReadBytes(size);
   mem = CVXMemFile(bytes.data(), bytes.size());
   return file;
 }

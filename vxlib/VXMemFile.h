@@ -32,11 +32,11 @@ class CVXMemFile : public CVXFile {
   void Seek(uint64_t position);
   // Drops all content.
   void Clear() { size_ = position_ = 0; }
+  uint64_t Remaining() const override { return size_ - position_; }
 
  protected:
   void WriteRaw(const void* buffer, size_t size) override;
   void ReadRaw(void* buffer, size_t size) override;
-  uint64_t Remaining() const override { return size_ - position_; }
 
  private:
   void Reserve_(size_t size);

@@ -32,6 +32,8 @@ class CBitVector {
   CBitVector& AndNot(const CBitVector& other);
   bool operator==(const CBitVector& other) const;  // same set, whatever the sizes
 
+  // Setting an index at or beyond npos - 1 throws a CVXException (10090); resetting an index
+  // beyond Size() does nothing.
   void Set(uint32_t index, bool value = true);
   void SetBulk(uint32_t index);
   void Reset(uint32_t index) { Set(index, false); }
@@ -39,7 +41,7 @@ class CBitVector {
   bool operator[](uint32_t index) const { return Get(index); }
   // Zeroes every bit and resets both bounds; the size stays.
   void Clear();
-  // Sets the size in bits; shrinking drops the bits beyond it.
+  // Sets the size in bits (at most npos - 1); shrinking drops the bits beyond it.
   void Resize(uint32_t bits);
 
   uint32_t Size() const { return size_; }
@@ -57,7 +59,7 @@ class CBitVector {
   void Convert(std::vector<uint32_t>& out) const;
 
   // Bytes of the stored form: Size() rounded up to 32 bits, over 8.
-  uint32_t BufferSize() const { return ((size_ + 31) / 32) * 4; }
+  uint32_t BufferSize() const { return static_cast<uint32_t>((uint64_t{size_} + 31) / 32 * 4); }
   // The bits as little-endian bytes; BufferSize() of them are meaningful.
   const uint8_t* Buffer() const { return reinterpret_cast<const uint8_t*>(words_.data()); }
   // Replaces the content with `bytes` bytes of bits (Size() becomes bytes * 8).
@@ -77,9 +79,17 @@ class CBitVector {
     iterator(const CBitVector* v, uint32_t i) : v_(v), i_(i) {}
     bool operator*() const { return v_->Get(i_); }
     uint32_t Index() const { return i_; }
-    iterator& operator++() { ++i_; return *this; }
-    iterator operator++(int) { iterator t = *this; ++i_; return t; }
+    iterator& operator++() {
+      ++i_;
+      return *this;
+    }
+    iterator operator++(int) {
+      iterator t = *this;
+      ++i_;
+      return t;
+    }
     bool operator==(const iterator& o) const { return i_ == o.i_; }
+
    private:
     const CBitVector* v_ = nullptr;
     uint32_t i_ = 0;
@@ -95,9 +105,17 @@ class CBitVector {
     set_iterator() = default;
     set_iterator(const CBitVector* v, uint32_t i) : v_(v), i_(i) {}
     uint32_t operator*() const { return i_; }
-    set_iterator& operator++() { i_ = i_ == npos ? npos : v_->NextSet(i_ + 1); return *this; }
-    set_iterator operator++(int) { set_iterator t = *this; ++*this; return t; }
+    set_iterator& operator++() {
+      i_ = i_ == npos ? npos : v_->NextSet(i_ + 1);
+      return *this;
+    }
+    set_iterator operator++(int) {
+      set_iterator t = *this;
+      ++*this;
+      return t;
+    }
     bool operator==(const set_iterator& o) const { return i_ == o.i_; }
+
    private:
     const CBitVector* v_ = nullptr;
     uint32_t i_ = npos;
@@ -110,8 +128,13 @@ class CBitVector {
   set_iterator end() const { return set_iterator(this, npos); }
 
  private:
+  // Grows to index + spare bits (at most npos - 1) if index is beyond the size; throws 10090
+  // for an index that no size can hold.
+  void GrowToHold_(uint32_t index, uint32_t spare);
   void Grow_(uint32_t bits);
   void RecomputeBounds_();
+  void RecomputeBoundsWithin_();
+  void FindBounds_(size_t fromWord, size_t toWord);
 
   std::vector<uint64_t> words_;
   uint32_t size_ = 0;

@@ -10,6 +10,7 @@
 #include "VXFileSystem.h"
 #include "VXLog.h"
 #include "VXPropDB.h"
+#include "VXTable.h"
 #include "VXResult.h"
 #include "VXXMPDB.h"
 
@@ -157,7 +158,8 @@ void CVXEngine::CreateStores_() {
   EnableCaching(info_.EnableCaching, info_.CacheSize);
 
   propDB_->SetLogfile(log_);
-  if ((rc = propDB_->Create(Path_(".vxp"))) != VX_OK) {
+  if ((rc = propDB_->Create(Path_(".vxp"))) != VX_OK ||
+      (rc = CreatePropertyTable_()) != VX_OK) {
     VX_ERROR(log_, rc, "Creating property database");
     VX_THROW(rc);
   }
@@ -189,6 +191,14 @@ void CVXEngine::CreateStores_() {
     // Each loaded plug-in gets its store and its id pair here once plug-ins can be loaded.
     LoadPlugIns(info_.PlugInFolder, false);
   }
+}
+
+// The image properties table exists from the start, without columns: the host defines the
+// columns it fills.
+unsigned CVXEngine::CreatePropertyTable_() {
+  CVXTable table(VX_IMAGE_PROPERTIES_TABLE);
+  table.Properties().Name = "Image Properties";
+  return propDB_->CreateTable(table);
 }
 
 // ---------------------------------------------------------------------------------------------

@@ -102,6 +102,7 @@ class CVXEngine : public CVXBase {
   unsigned LoadPlugIns(const std::string& folder, bool onlyKnown);
   unsigned FreePlugIns();
   void InitCoreInfo_();
+  unsigned CreatePropertyTable_();
   std::string Path_(const char* ext) const;
 
   CQRLLogfile* log_ = nullptr;  // not owned

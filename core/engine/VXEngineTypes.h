@@ -43,6 +43,8 @@ static_assert(sizeof(SVXCoreInfo) == 5154);
 
 constexpr uint16_t VX_CORE_INFO_VERSION = 768;  // bytes 0 and 3
 constexpr unsigned VX_APP_DATA_SIZE = 4096;
+// The property table that holds one row of image properties per file, keyed by the file's OID.
+constexpr uint32_t VX_IMAGE_PROPERTIES_TABLE = 1000;
 
 // What the host passes to CVXEngine::Create and Open; the engine keeps a copy.
 struct SVXCreateInfo {

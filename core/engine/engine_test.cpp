@@ -8,10 +8,14 @@
 #include <string>
 #include <vector>
 
+#include <algorithm>
 #include <stdexcept>
+#include <thread>
 
 #include "QRLBlobDB.h"
 #include "VXEngine.h"
+#include "VXPropDB.h"
+#include "VXTable.h"
 #include "VXException.h"
 #include "VXLog.h"
 #include "VXResult.h"
@@ -121,6 +125,8 @@ TEST_F(EngineTest, CreateMakesEveryStoreAndReopens) {
 
   ASSERT_EQ(engine_.Open(info_), VX_OK);
   EXPECT_EQ(engine_.GetThumbInfo().Width, 160u);
+  CVXTable table(1000);
+  EXPECT_EQ(engine_.GetPropertyDatabase().GetTable(table), VX_OK);
   EXPECT_EQ(engine_.Catalog().Groups().count(0xFFFFEFFF), 1u);
 }
 
@@ -265,6 +271,30 @@ TEST_F(EngineTest, DamagedStoreFilesGiveCodesNotCrashes) {
       }
     }
   }
+}
+
+// Public operations from many threads meet the engine's lock; run under ThreadSanitizer in CI.
+TEST_F(EngineTest, ConcurrentCallersAreSerialised) {
+  ASSERT_EQ(engine_.Create(info_), VX_OK);
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([this, t] {
+      uint8_t data[VX_APP_DATA_SIZE];
+      for (int i = 0; i < 50; ++i) {
+        std::memset(data, t * 50 + i, sizeof data);
+        EXPECT_EQ(engine_.SetAppData(data, sizeof data), VX_OK);
+        engine_.GetAppData(data);
+        // Whole records only: every byte comes from the same writer.
+        EXPECT_EQ(std::count(data, data + sizeof data, data[0]), VX_APP_DATA_SIZE);
+        EXPECT_EQ(engine_.Flush(), VX_OK);
+        std::string name;
+        EXPECT_EQ(engine_.GetPathAndName(name), VX_OK);
+        EXPECT_GT(engine_.LastUpdate(), 0);
+      }
+    });
+  }
+  for (auto& t : threads) t.join();
+  EXPECT_EQ(engine_.Close(), VX_OK);
 }
 
 TEST_F(EngineTest, OidsKeepRisingAcrossCloseAndOpen) {
