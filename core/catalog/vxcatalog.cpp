@@ -51,19 +51,11 @@ unsigned CVXCatalog::StoreHeader() {
 
 unsigned CVXCatalog::LoadHeader() {
   header_ = SVXCatalogHeader{};
-  // A record of another size than the header's is as damaged as a missing one.
-  auto load = [this](const CQRLBlobDB::SSelector& sel, SVXCatalogHeader& header) {
-    unsigned size = 0;
-    unsigned rc = store_.GetSize(sel, size);
-    if (rc == VX_OK && size != sizeof header) rc = VX_NOT_FOUND;
-    if (rc == VX_OK) rc = store_.Get(sel, &header, sizeof header);
-    return rc;
-  };
   SVXCatalogHeader buffer;
-  unsigned rc = load(kHeaderSel, buffer);
+  unsigned rc = store_.GetExact(kHeaderSel, &buffer, sizeof buffer);
   if (rc != VX_OK) {
     VX_WARN(Log_(), "Failed to load original header. Reverting to backup copy!");
-    rc = load(kHeaderCopySel, buffer);
+    rc = store_.GetExact(kHeaderCopySel, &buffer, sizeof buffer);
   }
   if (rc == VX_OK) header_ = buffer;
   return rc;

@@ -10,8 +10,8 @@
 #include "VXFileSystem.h"
 #include "VXLog.h"
 #include "VXPropDB.h"
-#include "VXTable.h"
 #include "VXResult.h"
+#include "VXTable.h"
 #include "VXXMPDB.h"
 
 namespace {
@@ -158,8 +158,7 @@ void CVXEngine::CreateStores_() {
   EnableCaching(info_.EnableCaching, info_.CacheSize);
 
   propDB_->SetLogfile(log_);
-  if ((rc = propDB_->Create(Path_(".vxp"))) != VX_OK ||
-      (rc = CreatePropertyTable_()) != VX_OK) {
+  if ((rc = propDB_->Create(Path_(".vxp"))) != VX_OK || (rc = CreatePropertyTable_()) != VX_OK) {
     VX_ERROR(log_, rc, "Creating property database");
     VX_THROW(rc);
   }
@@ -294,11 +293,8 @@ void CVXEngine::OpenStores_() {
 // Reads the core info from 1/1, falling back to the copy in 4/1.
 void CVXEngine::LoadCoreInfo_() {
   auto read = [this](const Sel& sel) {
-    unsigned size = 0;
-    unsigned rc = matchDB_.GetSize(sel, size);
-    if (rc == VX_OK && size != sizeof coreInfo_) rc = VX_NOT_FOUND;
     SVXCoreInfo info;
-    if (rc == VX_OK) rc = matchDB_.Get(sel, &info, sizeof info);
+    unsigned rc = matchDB_.GetExact(sel, &info, sizeof info);
     if (rc == VX_OK) coreInfo_ = info;
     return rc;
   };
@@ -315,11 +311,8 @@ void CVXEngine::LoadCoreInfo_() {
 // the old fields of the core info; an unreadable record is replaced by defaults.
 void CVXEngine::LoadThumbInfo_() {
   if (matchDB_.HasRecord(kThumbInfo)) {
-    unsigned size = 0;
     SVXThumbInfoNew info;
-    unsigned rc = matchDB_.GetSize(kThumbInfo, size);
-    if (rc == VX_OK && size != sizeof info) rc = VX_NOT_FOUND;
-    if (rc == VX_OK) rc = matchDB_.Get(kThumbInfo, &info, sizeof info);
+    unsigned rc = matchDB_.GetExact(kThumbInfo, &info, sizeof info);
     if (rc == VX_OK) {
       thumbInfo_ = info;
       return;

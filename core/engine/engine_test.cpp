@@ -14,11 +14,11 @@
 
 #include "QRLBlobDB.h"
 #include "VXEngine.h"
-#include "VXPropDB.h"
-#include "VXTable.h"
 #include "VXException.h"
 #include "VXLog.h"
+#include "VXPropDB.h"
 #include "VXResult.h"
+#include "VXTable.h"
 #include "vxtest.h"
 
 namespace {

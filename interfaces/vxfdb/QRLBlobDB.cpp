@@ -487,6 +487,13 @@ unsigned CQRLBlobDB::Get(const SSelector& sel, void* buffer, unsigned capacity) 
   });
 }
 
+unsigned CQRLBlobDB::GetExact(const SSelector& sel, void* buffer, unsigned size) {
+  unsigned actual = 0;
+  unsigned rc = GetSize(sel, actual);
+  if (rc != VX_OK) return rc;
+  return actual == size ? Get(sel, buffer, size) : VX_NOT_FOUND;
+}
+
 unsigned CQRLBlobDB::Get(const SSelector& sel, CVXMemFile& mem) {
   return impl_->ReadRecord(sel, "Get", [&](const uint8_t* data, size_t bytes) {
     uint8_t* out = mem.GetBuffer(bytes);

@@ -85,6 +85,9 @@ class CQRLBlobDB : public CVXBase {
   unsigned Get(const SSelector& sel, void* buffer, unsigned capacity);
   // Replaces the content of `mem` with the record and rewinds it; `mem` is kept when missing.
   unsigned Get(const SSelector& sel, CVXMemFile& mem);
+  // Fixed-size records (headers, settings): 10020, and nothing written, unless the record is
+  // exactly `size` bytes. A record of another size is as damaged as a missing one.
+  unsigned GetExact(const SSelector& sel, void* buffer, unsigned size);
   // 10020 and `size` 0 if the record is missing.
   unsigned GetSize(const SSelector& sel, unsigned& size);
   // All records one behind the other, in the order of `sels`, from one read transaction (or the
