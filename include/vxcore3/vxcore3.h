@@ -16,6 +16,7 @@
 #include "VXPropDB.h"
 #include "VXDBObject.h"
 #include "VXGroup.h"
+#include "VXGroupParser.h"
 #include "vxcatalog.h"
 #include "SelTempStore.h"
 #include "VXEngineTypes.h"
