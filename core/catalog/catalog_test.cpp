@@ -4,9 +4,12 @@
 #include <vector>
 
 #include "QRLBlobDB.h"
+#include "VXCatFile.h"
 #include "VXEngine.h"
 #include "VXException.h"
+#include "VXFolder.h"
 #include "VXResult.h"
+#include "VXURI.h"
 #include "vxcatalog.h"
 #include "vxtest.h"
 
@@ -111,10 +114,15 @@ TEST_F(CatalogTest, BothHeadersLostAreRebuiltFromContent) {
   Catalog().Create(Path());
   for (int i = 0; i < 3; ++i) Catalog().GenerateGroupOID();
   Catalog().GeneratePersistantSelectionOID();
+  CVXURI uri;
+  uri.Set("/photos/", true);
+  CVXFolder folder(uri, 4, 0);
+  ASSERT_EQ(Catalog().AddFolder(folder), VX_OK);
+  for (uint32_t oid : {1u, 2u, 7u}) {
+    ASSERT_EQ(Catalog().AddFile(4, CVXCatFile(oid, "f" + std::to_string(oid) + ".jpg", 4)), VX_OK);
+  }
   Catalog().Close();
   WithStore([](CQRLBlobDB& db) {
-    for (uint32_t oid : {1u, 2u, 7u}) ASSERT_EQ(db.Set(Sel(3, oid), "f", 1), VX_OK);
-    ASSERT_EQ(db.Set(Sel(2, 4), "d", 1), VX_OK);
     ASSERT_EQ(db.Remove(Sel(1, 1)), VX_OK);
     ASSERT_EQ(db.Set(Sel(21, 1), "xx", 2), VX_OK);
   });
@@ -183,10 +191,11 @@ TEST_F(CatalogTest, OpenSendsLoadMessagesToTheEngine) {
     static_cast<Seen*>(user)->messages.emplace_back(m, a);
   };
   ASSERT_EQ(engine.Open(info, cb, &seen), VX_OK);
-  // Groups: begin, 0 %, 100 % after the one category, the closing 100 %, stage end; then the
-  // catalog's own end of loading.
-  std::vector<std::pair<unsigned, unsigned long>> want = {{5002, 0},   {5003, 0}, {5003, 100},
-                                                          {5003, 100}, {5004, 0}, {5004, 0}};
+  // Files and folders of an empty catalog: begin, 0 %, 100 %, end. Groups: begin, 0 %, 100 %
+  // after the one category, the closing 100 %, end. Then the catalog's own end of loading.
+  std::vector<std::pair<unsigned, unsigned long>> want = {
+      {5000, 0}, {5003, 0}, {5003, 100}, {5004, 0},   {5001, 0},   {5003, 0}, {5003, 100},
+      {5004, 0}, {5002, 0}, {5003, 0},   {5003, 100}, {5003, 100}, {5004, 0}, {5004, 0}};
   EXPECT_EQ(seen.messages, want);
   seen.messages.clear();
   engine.Catalog().Notify(5003, 1, 0, nullptr);

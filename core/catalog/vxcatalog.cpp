@@ -8,6 +8,8 @@
 #include "VXLog.h"
 #include "VXMemFile.h"
 #include "VXResult.h"
+#include "vxcatalog_frame.h"
+#include "xstring.h"
 
 namespace {
 
@@ -31,6 +33,8 @@ void CVXCatalog::Reset() {
   try {
     dirty_ = false;
     groups_.clear();
+    files_.clear();
+    folders_.clear();
     header_ = SVXCatalogHeader{};
   } catch (...) {
     VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
@@ -132,6 +136,14 @@ void CVXCatalog::Open(const std::string& path, bool readOnly) {
 }
 
 void CVXCatalog::OpenContent_(bool headerDamaged) {
+  if (LoadFiles() != VX_OK) {
+    VX_ERROR(Log_(), VX_NOT_FOUND, "Loading files");
+    VX_THROW(VX_NOT_FOUND);
+  }
+  if (LoadFolders() != VX_OK) {
+    VX_ERROR(Log_(), VX_NOT_FOUND, "Loading folders");
+    VX_THROW(VX_NOT_FOUND);
+  }
   if (LoadGroups() != VX_OK) {
     VX_ERROR(Log_(), VX_NOT_FOUND, "Loading groups");
     VX_THROW(VX_NOT_FOUND);
@@ -139,29 +151,28 @@ void CVXCatalog::OpenContent_(bool headerDamaged) {
   if (headerDamaged) RestoreHeader_();
 }
 
-// Rebuilds a header whose two copies are lost from what the store holds. The counters become
-// the highest OID in use plus 1, so the next generated OID is two above it; the persistent
-// selection counter restarts at 0.
+// Rebuilds a header whose two copies are lost from the loaded maps. The counters become the
+// highest OID in use plus 1, so the next generated OID is two above it; the persistent selection
+// counter restarts at 0.
 void CVXCatalog::RestoreHeader_() {
   CQRLLogfile* log = Log_();
   VX_LOG(log, 3, "RESTORING damaged header information from database contents: ");
-  header_.LastFileOid = HighestOid_(rtFile, 0) + 1;
+  header_.LastFileOid = HighestOid_(files_, 0) + 1;
   VX_LOGF(log, 3, "  Next file OID: %lu", static_cast<unsigned long>(header_.LastFileOid));
-  header_.LastFolderOid = HighestOid_(rtFolder, 0) + 1;
+  header_.LastFolderOid = HighestOid_(folders_, 0) + 1;
   VX_LOGF(log, 3, "  Next folder OID: %lu", static_cast<unsigned long>(header_.LastFolderOid));
-  header_.LastGroupOid = HighestOid_(rtGroup, VX_ALL_GROUP_OID) + 1;
+  header_.LastGroupOid = HighestOid_(groups_, VX_ALL_GROUP_OID) + 1;
   VX_LOGF(log, 3, "  Next group OID: %lu", static_cast<unsigned long>(header_.LastGroupOid));
   header_.LastPersSelOid = 0;
   VX_LOG(log, 3, "  Storing recovered header...");
   StoreHeader();
 }
 
-// Highest OID of a record type in the store, leaving out `ignore`; 0 when there is none.
-uint32_t CVXCatalog::HighestOid_(ERecordType type, uint32_t ignore) {
-  std::vector<uint32_t> oids;
-  if (store_.GetOids(type, oids, true) != VX_OK) return 0;
-  for (auto it = oids.rbegin(); it != oids.rend(); ++it) {
-    if (*it != ignore) return *it;
+// Highest key of a map, leaving out `ignore`; 0 when there is none.
+template <typename T>
+uint32_t CVXCatalog::HighestOid_(const std::map<uint32_t, T>& map, uint32_t ignore) {
+  for (auto it = map.rbegin(); it != map.rend(); ++it) {
+    if (it->first != ignore) return it->first;
   }
   return 0;
 }
@@ -193,49 +204,35 @@ uint32_t CVXCatalog::GeneratePersistantSelectionOID() {
   return NextOid_(&SVXCatalogHeader::LastPersSelOid);
 }
 
-unsigned CVXCatalog::StoreGroup(uint32_t oid) {
-  auto it = groups_.find(oid);
-  if (it == groups_.end()) return VX_NOT_FOUND;
-  CVXMemFile file(false, 0, 4096);
-  file << it->second;
-  unsigned rc = store_.Set(CQRLBlobDB::SSelector(rtGroup, oid), file.GetBuffer(),
-                           static_cast<unsigned>(file.GetFileSize()), 0);
-  if (rc != VX_OK) VX_ERROR(Log_(), rc, "Storing group");
-  return rc;
-}
+unsigned CVXCatalog::StoreFile(uint32_t oid) { return StoreRecord_(rtFile, files_, oid); }
+unsigned CVXCatalog::StoreFolder(uint32_t oid) { return StoreRecord_(rtFolder, folders_, oid); }
+unsigned CVXCatalog::StoreGroup(uint32_t oid) { return StoreRecord_(rtGroup, groups_, oid); }
 
-unsigned CVXCatalog::LoadGroup(uint32_t oid, CVXGroup& group) {
+// Reads one record into `object` through a memory file; a record that does not read gives its
+// code and leaves `object` as it was.
+template <typename T>
+unsigned CVXCatalog::LoadRecord_(ERecordType type, uint32_t oid, T& object) {
   CVXMemFile file;
-  unsigned rc = store_.Get(CQRLBlobDB::SSelector(rtGroup, oid), file);
+  unsigned rc = store_.Get(CQRLBlobDB::SSelector(type, oid), file);
   if (rc != VX_OK) return rc;
   try {
-    file >> group;
+    file >> object;
   } catch (...) {
     return VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
   }
   return VX_OK;
 }
 
-// Reads every category into a temporary map, which replaces the map only when all were read.
-unsigned CVXCatalog::LoadGroups() {
-  Notify(cbmLoadGroups, 0, 0, nullptr);
-  Notify(cbmLoadProgress, 0, 0, nullptr);
-  std::vector<uint32_t> oids;
-  unsigned rc = store_.GetOids(rtGroup, oids, false);
-  std::map<uint32_t, CVXGroup> loaded;
-  unsigned lastPercent = 0;
-  for (size_t i = 0; rc == VX_OK && i < oids.size(); ++i) {
-    CVXGroup group;
-    rc = LoadGroup(oids[i], group);
-    if (rc != VX_OK) break;
-    if (group.Name() == "@Interactive") interactiveGroup_ = oids[i];
-    loaded.emplace(oids[i], std::move(group));
-    unsigned percent = static_cast<unsigned>(std::min(100.0, (i + 1) * 100.0 / oids.size()));
-    if (percent != lastPercent) Notify(cbmLoadProgress, percent, 0, nullptr);
-    lastPercent = percent;
-  }
-  if (rc == VX_OK) groups_ = std::move(loaded);
-  Notify(cbmLoadProgress, 100, 0, nullptr);
-  Notify(cbmLoadStageEnded, 0, 0, nullptr);
+unsigned CVXCatalog::LoadFile(uint32_t oid, CVXCatFile& file) {
+  return LoadRecord_(rtFile, oid, file);
+}
+
+unsigned CVXCatalog::LoadFolder(uint32_t oid, CVXFolder& folder) {
+  unsigned rc = LoadRecord_(rtFolder, oid, folder);
+  ConnectChildren();
   return rc;
+}
+
+unsigned CVXCatalog::LoadGroup(uint32_t oid, CVXGroup& group) {
+  return LoadRecord_(rtGroup, oid, group);
 }

@@ -4,13 +4,18 @@
 #include <ctime>
 #include <map>
 #include <string>
+#include <vector>
 
 #include "QRLBlobDB.h"
 #include "VXBase.h"
+#include "VXCatFile.h"
+#include "VXFolder.h"
 #include "VXGroup.h"
+#include "bitvector.h"
 
 class CVXEngine;
 class CQRLLogfile;
+class CVXPersistantSelection;
 
 #pragma pack(push, 1)
 // Header of the catalog store, records 1/1 and 21/1 (backup). Loading copies the 278 bytes over
@@ -71,33 +76,147 @@ class CVXCatalog : public CVXBase {
   uint32_t GenerateGroupOID();
   uint32_t GeneratePersistantSelectionOID();
 
+  // ---- Files. Lookups copy records out; 10020 when the object is absent.
+  unsigned LookupFile(uint32_t oid, CVXCatFile& out) const;
+  unsigned GetFileURI(uint32_t oid, CVXURI& out) const;
+  unsigned GetFileFolder(uint32_t oid, unsigned long& folder) const;
+  // OID of the folder's first file of that name (case-insensitive), or 0.
+  uint32_t LookupFile(const std::string& name, uint32_t folderOid) const;
+  uint32_t FolderLookupFile(const CVXFolder& folder, const std::string& name) const;
+  unsigned LookupFile(uint32_t crc, const std::string& mediaID, const std::string& mediaSerial,
+                      std::vector<uint32_t>& out) const;
+  unsigned GetFiles(CBitVector& bits) const;
+  unsigned GetFilesForFormat(const CBitVector& formats, CBitVector& bits) const;
+  unsigned GetFilesForCRC(uint32_t crc, uint32_t size, CBitVector& bits) const;
+  unsigned GetFilesForOrientation(bool portrait, CBitVector& bits) const;
+  unsigned GetRank(int32_t rank, CBitVector& bits);
+  unsigned GetLabel(const char* label, CBitVector& bits);
+  size_t NumberOfFiles() const { return files_.size(); }
+  bool IsUniqueFileOID(uint32_t oid) const { return files_.count(oid) == 0; }
+
+  unsigned AddFile(uint32_t folderOid, const CVXCatFile& file);
+  unsigned UpdateFile(const CVXCatFile& file);
+  unsigned RemoveFile(uint32_t oid);
+  unsigned RenameFile(uint32_t oid, const std::string& newName);
+  unsigned MoveFile(uint32_t oid, uint32_t folderOid, const std::string& newName);
+  unsigned CopyFile(uint32_t oid, uint32_t folderOid, unsigned long& newOid,
+                    const std::string& newName);
+
+  // ---- Folders.
+  unsigned LookupFolder(uint32_t oid, CVXFolder& out) const;
+  uint32_t LookupFolder(const CVXURI& uri, const std::string& mediaID,
+                        const std::string& mediaSerial) const;
+  uint32_t FindParentFolder(const CVXFolder& folder) const;
+  uint32_t FindParentFolder(const CVXURI& uri, const std::string& mediaID,
+                            const std::string& mediaSerial) const;
+  unsigned EnumFolders(const CVXURI& uri, std::vector<CVXFolder>& out) const;
+  unsigned GetRootFolders(std::vector<uint32_t>& out) const;
+  unsigned GetFolders(std::vector<uint32_t>& out) const;
+  unsigned GetFolderChildren(uint32_t oid, std::vector<uint32_t>& out, bool recursive);
+  unsigned GetFolderFiles(uint32_t oid, CBitVector& bits, bool recursive);
+  unsigned GetFolderFiles(uint32_t oid, std::vector<uint32_t>& out, bool recursive);
+  uint32_t GetFolderThumb(uint32_t oid) const;
+  size_t NumberOfFolders() const { return folders_.size(); }
+  bool IsUniqueFolderOID(uint32_t oid) const { return folders_.count(oid) == 0; }
+
+  unsigned AddFolder(const CVXFolder& folder);
+  unsigned UpdateFolder(const CVXFolder& folder);
+  unsigned RemoveFolder(uint32_t oid, bool recursive);
+  unsigned RenameFolder(uint32_t oid, const CVXURI& newURI, const std::string& newMediaID,
+                        const std::string& newMediaSerial);
+
+  size_t NumberOfGroups() const { return groups_.size(); }
+
+  // ---- Persistent selections and file transforms, as far as file and folder changes reach
+  // them. `sel` null means every selection.
+  unsigned InvalidatePersistantSelections(const CVXPersistantSelection* sel);
+  unsigned InvalidatePersistantSelectionsForKey(const char* key);
+  unsigned RemoveFileTransform(uint32_t oid);
+
   bool IsDirty() const { return dirty_; }
   int32_t LastPersistantSelectionUpdate() const { return lastPersSelUpdate_; }
   bool PersSelDirty() const { return persSelDirty_; }
   uint32_t InteractiveGroup() const { return interactiveGroup_; }
   const SVXCatalogHeader& Header() const { return header_; }
   const std::map<uint32_t, CVXGroup>& Groups() const { return groups_; }
+  const std::map<uint32_t, CVXCatFile>& Files() const { return files_; }
+  const std::map<uint32_t, CVXFolder>& Folders() const { return folders_; }
   // The catalog's store, for the engine's statistics, self test and optimisation.
   CQRLBlobDB& BlobDB() { return store_; }
 
  protected:
   unsigned StoreHeader();
   unsigned LoadHeader();
+  unsigned StoreFile(uint32_t oid);
+  unsigned LoadFile(uint32_t oid, CVXCatFile& file);
+  unsigned StoreFolder(uint32_t oid);
+  unsigned LoadFolder(uint32_t oid, CVXFolder& folder);
   unsigned StoreGroup(uint32_t oid);
   unsigned LoadGroup(uint32_t oid, CVXGroup& group);
+  unsigned LoadFiles();
+  unsigned LoadFolders();
   unsigned LoadGroups();
+
+  // Pointers into the maps for friend code; null when absent.
+  CVXCatFile* GetFile(uint32_t oid);
+  CVXFolder* GetFolder(uint32_t oid);
+  const CVXFolder* GetFolder(uint32_t oid) const;
+
+  // Throw CVXException* with the code on failure.
+  void InternalAddFile(uint32_t oid, uint32_t folderOid, CVXCatFile& file);
+  void InternalRemoveFile(uint32_t oid);
+  void InternalAddFolder(uint32_t oid, const CVXFolder& folder);
+  void InternalRemoveFolder(uint32_t oid);
+  // Links every parentless folder to the folder one path element up on the same medium.
+  void ConnectChildren();
+  unsigned _RecurseFolder(uint32_t oid, CBitVector& bits);
+  unsigned _RecurseFolderChildren(uint32_t oid, std::vector<uint32_t>& out);
   void SetDirty(bool dirty) { dirty_ = dirty; }
 
  private:
   CQRLLogfile* Log_() const;
+  // The frame of every mutating operation: entry and exit lines, the body's exceptions turned
+  // into codes, a failure logged. Without `catchVX` a CVXException counts as a framework
+  // exception (10003), whatever its code.
+  template <typename Body>
+  unsigned Frame_(const char* name, int level, const std::string* objectName, bool catchVX,
+                  Body&& body);
+  template <typename T>
+  unsigned StoreRecord_(ERecordType type, const std::map<uint32_t, T>& map, uint32_t oid);
+  unsigned RemoveRecord_(ERecordType type, uint32_t oid);
+  unsigned CountRecords_(ERecordType type, unsigned& count);
+  // Marks every clean stored selection dirty (all of them when `key` is null, else those with a
+  // selector on that key) and returns the result of the walk.
+  unsigned MarkPersistantSelectionsDirty_(const char* key = nullptr);
+  void RemoveFileFromPersistantSelections_(uint32_t oid);
+  void RemapFolders_();
+  bool RemapFolder_(uint32_t oid, CVXFolder& folder);
+  uint32_t ParentOidFor_(const std::string& uriText, const std::string& mediaID,
+                         const std::string& mediaSerial) const;
+  unsigned RenameToFreeTarget_(uint32_t oid, const CVXURI& newURI, const std::string& newMediaID,
+                               const std::string& newMediaSerial);
+  unsigned MergeFolder_(uint32_t oid, const CVXFolder& before, uint32_t targetOid, bool& closing);
+  void ClearFolderReferences_(uint32_t folderOid);
+  unsigned RenameChildren_(const std::vector<uint32_t>& children, const std::string& base,
+                           const std::string& mediaID, const std::string& mediaSerial,
+                           bool stopOnFailure);
   void CreateContent_();
   void OpenContent_(bool headerDamaged);
   void RestoreHeader_();
-  uint32_t HighestOid_(ERecordType type, uint32_t ignore);
+  template <typename T>
+  static uint32_t HighestOid_(const std::map<uint32_t, T>& map, uint32_t ignore);
+  template <typename T>
+  unsigned LoadRecord_(ERecordType type, uint32_t oid, T& object);
+  // Reads every record of `type` one at a time into `loaded`, with progress messages; stops at
+  // the first failure.
+  template <typename T>
+  unsigned LoadEach_(ERecordType type, std::map<uint32_t, T>& loaded, bool sequential);
   uint32_t NextOid_(uint32_t SVXCatalogHeader::*field);
 
   CVXEngine* engine_ = nullptr;  // not owned
   std::map<uint32_t, CVXGroup> groups_;
+  std::map<uint32_t, CVXCatFile> files_;
+  std::map<uint32_t, CVXFolder> folders_;
   SVXCatalogHeader header_;
   CQRLBlobDB store_;
   int32_t lastPersSelUpdate_;

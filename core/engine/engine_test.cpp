@@ -133,8 +133,8 @@ TEST_F(EngineTest, CreateMakesEveryStoreAndReopens) {
 TEST_F(EngineTest, SecondOpenerGetsSharingViolation) {
   ASSERT_EQ(engine_.Create(info_), VX_OK);
   EXPECT_EQ(OpenInChildProcess(info_.Name), VX_SHARING_VIOLATION);
+  vxtest::CapturedLog log;  // outlives the engine that writes to it
   CVXEngine second;
-  vxtest::CapturedLog log;
   second.SetLogFile(&log);
   EXPECT_EQ(second.Open(info_), VX_SHARING_VIOLATION);
   EXPECT_TRUE(log.Has("Sharing Violation while opening the database!"));

@@ -1,0 +1,50 @@
+#pragma once
+
+// The operation frame and the record store shared by the catalog's source files. Internal.
+
+#include <exception>
+
+#include "VXException.h"
+#include "VXLog.h"
+#include "VXMemFile.h"
+#include "VXResult.h"
+#include "vxcatalog.h"
+
+template <typename Body>
+unsigned CVXCatalog::Frame_(const char* name, int level, const std::string* objectName,
+                            bool catchVX, Body&& body) {
+  CQRLLogfile* log = Log_();
+  VX_LOGF(log, level, "+ CVXCatalog::%s", name);
+  if (objectName) VX_LOGF(log, 4, "%s", objectName->c_str());
+  unsigned rc = VX_OK;
+  try {
+    rc = body();
+  } catch (CVXException* e) {
+    if (catchVX) {
+      rc = e->GetCode();
+    } else {
+      rc = VX_FRAMEWORK_EXCEPTION;
+    }
+    if (log) log->AddError(e, __LINE__, __FILE__);
+    delete e;
+  } catch (...) {
+    rc = VXCodeOfCurrentException(log, __LINE__, __FILE__);
+  }
+  if (rc != VX_OK) VX_ERROR(log, rc, "");
+  VX_LOGF(log, level, "- CVXCatalog::%s", name);
+  return rc;
+}
+
+// Serialises the map's object into one record; 10020 when the map lacks it.
+template <typename T>
+unsigned CVXCatalog::StoreRecord_(ERecordType type, const std::map<uint32_t, T>& map,
+                                  uint32_t oid) {
+  auto it = map.find(oid);
+  if (it == map.end()) return VX_NOT_FOUND;
+  CVXMemFile file(false, 0, 4096);
+  file << it->second;
+  unsigned rc = store_.Set(CQRLBlobDB::SSelector(type, oid), file.GetBuffer(),
+                           static_cast<unsigned>(file.GetFileSize()), 0);
+  if (rc != VX_OK) VX_ERROR(Log_(), rc, "Storing record");
+  return rc;
+}
