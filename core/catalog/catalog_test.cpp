@@ -106,7 +106,7 @@ TEST_F(CatalogTest, DamagedMainHeaderFallsBackToCopy) {
   ASSERT_EQ(OpenCode(), VX_OK);
   EXPECT_TRUE(log_.Has("Failed to load original header. Reverting to backup copy!"));
   EXPECT_FALSE(log_.Has("BOTH copies"));
-  EXPECT_EQ(Catalog().Header().LastFileOid, 5u);
+  EXPECT_EQ(uint32_t{Catalog().Header().LastFileOid}, 5u);
   EXPECT_EQ(Catalog().GenerateFileOID(), 6u);
 }
 
@@ -140,7 +140,7 @@ TEST_F(CatalogTest, BothHeadersLostAreRebuiltFromContent) {
   Catalog().Close();
   // The recovered header was stored: a plain reopen keeps the counters.
   ASSERT_EQ(OpenCode(), VX_OK);
-  EXPECT_EQ(Catalog().Header().LastFileOid, 9u);
+  EXPECT_EQ(uint32_t{Catalog().Header().LastFileOid}, 9u);
 }
 
 TEST_F(CatalogTest, SecondOpenerAndBadFilesGiveCodes) {

@@ -124,7 +124,7 @@ TEST_F(EngineTest, CreateMakesEveryStoreAndReopens) {
   });
 
   ASSERT_EQ(engine_.Open(info_), VX_OK);
-  EXPECT_EQ(engine_.GetThumbInfo().Width, 160u);
+  EXPECT_EQ(uint32_t{engine_.GetThumbInfo().Width}, 160u);
   CVXTable table(1000);
   EXPECT_EQ(engine_.GetPropertyDatabase().GetTable(table), VX_OK);
   EXPECT_EQ(engine_.Catalog().Groups().count(0xFFFFEFFF), 1u);
@@ -207,12 +207,12 @@ TEST_F(EngineTest, MissingThumbSettingsAreSeededFromTheOldFieldsEvenReadOnly) {
   });
   ASSERT_EQ(engine_.Open(info_), VX_OK);
   SVXThumbInfoNew t = engine_.GetThumbInfo();
-  EXPECT_EQ(t.Field0, 3u);
-  EXPECT_EQ(t.Width, 64u);
-  EXPECT_EQ(t.Height, 48u);
-  EXPECT_EQ(t.Depth, 16u);
-  EXPECT_EQ(t.Quality, 55u);
-  EXPECT_EQ(t.Version, 1u);
+  EXPECT_EQ(uint32_t{t.Field0}, 3u);
+  EXPECT_EQ(uint32_t{t.Width}, 64u);
+  EXPECT_EQ(uint32_t{t.Height}, 48u);
+  EXPECT_EQ(uint32_t{t.Depth}, 16u);
+  EXPECT_EQ(uint32_t{t.Quality}, 55u);
+  EXPECT_EQ(uint32_t{t.Version}, 1u);
   ASSERT_EQ(engine_.Close(), VX_OK);
   WithMatchStore([](CQRLBlobDB& db) { EXPECT_EQ(Record(db, Sel(5, 1)).size(), 280u); });
 
@@ -221,8 +221,8 @@ TEST_F(EngineTest, MissingThumbSettingsAreSeededFromTheOldFieldsEvenReadOnly) {
   log_.ClearCaptured();
   ASSERT_EQ(engine_.Open(info_), VX_OK);
   EXPECT_TRUE(log_.Has("Loading core info copy"));
-  EXPECT_EQ(engine_.GetThumbInfo().Width, 200u);
-  EXPECT_EQ(engine_.GetThumbInfo().Quality, 75u);
+  EXPECT_EQ(uint32_t{engine_.GetThumbInfo().Width}, 200u);
+  EXPECT_EQ(uint32_t{engine_.GetThumbInfo().Quality}, 75u);
 }
 
 TEST_F(EngineTest, ReadOnlyOpenRecreatesALostSortStoreAndRefusesMutation) {

@@ -56,7 +56,7 @@ TEST_F(SelTempStoreTest, ChecksumIsTheOnlyTest) {
   // A foreign magic with a right checksum opens; the last OID is kept and written back.
   vxtest::WriteFile(Path(), EmptyStoreBytes(41, "ABCD"));
   ASSERT_EQ(store_.Open(Path(), false), VX_OK);
-  EXPECT_EQ(store_.Header().LastOid, 41u);
+  EXPECT_EQ(uint32_t{store_.Header().LastOid}, 41u);
   ASSERT_EQ(store_.Close(), VX_OK);
   EXPECT_EQ(vxtest::ReadFile(Path()), EmptyStoreBytes(41, "ABCD"));
 
