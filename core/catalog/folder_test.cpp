@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include "vxbytes.h"
+
 #include <cstring>
 #include <ctime>
 #include <string>
@@ -13,19 +15,7 @@
 namespace {
 
 // Little-endian byte builder for hand-made records.
-struct Bytes {
-  std::vector<uint8_t> b;
-  template <typename T>
-  Bytes& le(T v) {
-    for (size_t i = 0; i < sizeof v; ++i) b.push_back(static_cast<uint8_t>(uint64_t(v) >> 8 * i));
-    return *this;
-  }
-  Bytes& str(const std::string& s) {
-    le(uint32_t(s.size()));
-    b.insert(b.end(), s.begin(), s.end());
-    return *this;
-  }
-};
+using vxtest::Bytes;
 
 // Reaches the fields that only Properties() exposes.
 class Folder : public CVXFolder {

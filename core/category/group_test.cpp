@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include "vxbytes.h"
+
 #include <cstring>
 #include <string>
 #include <vector>
@@ -12,20 +14,7 @@
 namespace {
 
 // Little-endian byte builder for hand-made records.
-struct Bytes {
-  std::vector<uint8_t> b;
-  Bytes& u16(uint16_t v) { return raw(&v, 2); }
-  Bytes& u32(uint32_t v) { return raw(&v, 4); }
-  Bytes& str(const std::string& s) {
-    u32(static_cast<uint32_t>(s.size()));
-    return raw(s.data(), s.size());
-  }
-  Bytes& raw(const void* p, size_t n) {
-    auto* c = static_cast<const uint8_t*>(p);
-    b.insert(b.end(), c, c + n);
-    return *this;
-  }
-};
+using vxtest::Bytes;
 
 std::vector<uint8_t> Serialise(const CVXGroup& g) {
   CVXMemFile file;
