@@ -29,7 +29,16 @@ uint64_t MaskBelow(uint32_t bit) {
 }
 
 // The hardware popcount is not part of baseline x86-64; pick it at load time where present.
-#if defined(__x86_64__) && defined(__ELF__)
+// Not under ThreadSanitizer: the resolver runs while the library is relocated, before the
+// sanitizer's runtime is up, and its instrumented entry crashes there.
+#if defined(__SANITIZE_THREAD__)
+#define VX_NO_LOAD_TIME_DISPATCH 1
+#elif defined(__has_feature)
+#if __has_feature(thread_sanitizer)
+#define VX_NO_LOAD_TIME_DISPATCH 1
+#endif
+#endif
+#if defined(__x86_64__) && defined(__ELF__) && !defined(VX_NO_LOAD_TIME_DISPATCH)
 #define VX_POPCNT_CLONES [[gnu::target_clones("popcnt", "default")]]
 #else
 #define VX_POPCNT_CLONES
