@@ -11,59 +11,20 @@
 #include "VXResult.h"
 #include "VXURI.h"
 #include "vxcatalog.h"
+#include "vxcatalog_fixture.h"
 #include "vxtest.h"
 
 namespace {
 
-// A catalog on its own store, logging through an engine that stays closed.
-class CatalogOps : public ::testing::Test {
+class CatalogOps : public vxtest::CatalogFixture {
  protected:
-  void SetUp() override {
-    engine_.SetLogFile(&log_);
-    Cat().Create(dir_ / "db.vxc");
-  }
-  CVXCatalog& Cat() { return engine_.Catalog(); }
-
-  uint32_t AddFolder(const std::string& uri, const std::string& media = "VOL",
-                     const std::string& serial = "1234") {
-    uint32_t oid = Cat().GenerateFolderOID();
-    CVXFolder folder(CVXURI(uri, true), oid, 0);
-    folder.MediaID() = media;
-    folder.MediaSerial() = serial;
-    EXPECT_EQ(Cat().AddFolder(folder), VX_OK);
-    return oid;
-  }
-  uint32_t AddFile(uint32_t folder, const std::string& name, uint32_t w = 40, uint32_t h = 30,
-                   uint32_t crc = 0) {
-    uint32_t oid = Cat().GenerateFileOID();
-    CVXCatFile file(oid, name, folder);
-    file.Properties().Width = w;
-    file.Properties().Height = h;
-    file.Properties().CRC = crc;
-    EXPECT_EQ(Cat().AddFile(folder, file), VX_OK);
-    return oid;
-  }
-  CVXFolder Folder(uint32_t oid) {
-    CVXFolder f;
-    EXPECT_EQ(Cat().LookupFolder(oid, f), VX_OK);
-    return f;
-  }
   std::string UriOf(uint32_t folder) { return Folder(folder).URI().AsString(); }
-  void Reopen() {
-    Cat().Close();
-    Cat().Reset();
-    Cat().Open(dir_ / "db.vxc", false);
-  }
   template <typename T>
   static std::vector<uint8_t> Bytes(const T& record) {
     CVXMemFile f;
     f << record;
     return {f.GetBuffer(), f.GetBuffer() + f.GetFileSize()};
   }
-
-  vxtest::TempDir dir_;
-  vxtest::CapturedLog log_;
-  CVXEngine engine_;
 };
 
 TEST_F(CatalogOps, TreeLinksWhateverTheOrderAndSurvivesReopen) {

@@ -92,7 +92,8 @@ TEST_F(CatalogTest, OidsStartAtOneAndKeepRisingAcrossReopen) {
   for (uint32_t round = 0; round < 3; ++round) {
     ASSERT_EQ(OpenCode(), VX_OK);
     EXPECT_EQ(Catalog().GenerateFileOID(), 3u + round);
-    EXPECT_EQ(Catalog().GenerateGroupOID(), 2u + round);
+    // The first load adds "@Interactive" with group OID 2.
+    EXPECT_EQ(Catalog().GenerateGroupOID(), 3u + round);
     Catalog().Close();
   }
 }
@@ -132,15 +133,43 @@ TEST_F(CatalogTest, BothHeadersLostAreRebuiltFromContent) {
   EXPECT_TRUE(log_.Has("RESTORING damaged header information from database contents: "));
   EXPECT_TRUE(log_.HasLine("  Next file OID: 8"));
   // Restored counters are the highest OID plus 1; generating adds 1 again. The super category
-  // never raises the group counter, and the selection counter restarts.
+  // never raises the group counter (the interactive category, made while loading, took 1), and
+  // the selection counter restarts.
   EXPECT_EQ(Catalog().GenerateFileOID(), 9u);
   EXPECT_EQ(Catalog().GenerateFolderOID(), 6u);
-  EXPECT_EQ(Catalog().GenerateGroupOID(), 2u);
+  EXPECT_EQ(Catalog().GenerateGroupOID(), 3u);
   EXPECT_EQ(Catalog().GeneratePersistantSelectionOID(), 1u);
   Catalog().Close();
   // The recovered header was stored: a plain reopen keeps the counters.
   ASSERT_EQ(OpenCode(), VX_OK);
   EXPECT_EQ(uint32_t{Catalog().Header().LastFileOid}, 9u);
+}
+
+TEST_F(CatalogTest, InteractiveCategoryIsMadeOnceAndForgetsItsFormula) {
+  Catalog().Create(Path());
+  Catalog().Close();
+  ASSERT_EQ(OpenCode(), VX_OK);
+  uint32_t interactive = Catalog().GetInteractiveGroup();
+  ASSERT_NE(interactive, 0u);
+  CVXGroup g;
+  ASSERT_EQ(Catalog().LookupGroup(interactive, g), VX_OK);
+  EXPECT_EQ(g.Name(), "@Interactive");
+  EXPECT_EQ(g.Flags(), 96u);
+  EXPECT_EQ(g.SortSequence(), -2);
+  CVXGroup a(Catalog().GenerateGroupOID());
+  a.Name() = "A";
+  ASSERT_EQ(Catalog().AddGroup(a), VX_OK);
+  ASSERT_EQ(g.SetExpression(Catalog(), "\"A\"").code, VX_OK);
+  ASSERT_EQ(Catalog().UpdateGroup(g), VX_OK);
+  Catalog().Close();
+  for (bool readOnly : {true, false}) {
+    ASSERT_EQ(OpenCode(readOnly), VX_OK);
+    EXPECT_EQ(Catalog().GetInteractiveGroup(), interactive);
+    ASSERT_EQ(Catalog().LookupGroup(interactive, g), VX_OK);
+    EXPECT_TRUE(g.Postfix().empty()) << (readOnly ? "read-only" : "writable");
+    EXPECT_EQ(Catalog().NumberOfGroups(), 3u);
+    Catalog().Close();
+  }
 }
 
 TEST_F(CatalogTest, SecondOpenerAndBadFilesGiveCodes) {

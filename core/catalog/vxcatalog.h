@@ -125,6 +125,33 @@ class CVXCatalog : public CVXBase {
   unsigned RenameFolder(uint32_t oid, const CVXURI& newURI, const std::string& newMediaID,
                         const std::string& newMediaSerial);
 
+  // ---- Categories. Callers take a copy, change it and hand it back to UpdateGroup.
+  unsigned LookupGroup(uint32_t oid, CVXGroup& out) const;
+  // OID of the first category whose full name equals `fullName` exactly, with case; 0 if none.
+  uint32_t LookupGroup(const std::string& fullName) const;
+  unsigned GetGroupSortInfo(uint32_t oid, int& sortSequence, std::string& name) const;
+  // "Top.Middle.Leaf"; 10020 with the partial name when a parent is missing.
+  unsigned GetFullGroupName(uint32_t oid, std::string& name) const;
+  unsigned GetGroups(std::vector<uint32_t>& out) const;
+  unsigned GetGroupChildrenRecursive(uint32_t oid, std::vector<uint32_t>& out) const;
+  unsigned GetGroupReferrers(uint32_t oid, unsigned refType, std::vector<uint32_t>& out);
+  unsigned GroupDependsOn(uint32_t oid, uint32_t otherOid, bool& depends);
+  unsigned GetGroupImages(uint32_t oid, std::vector<uint32_t>& out);
+  unsigned GetFileGroups(uint32_t fileOid, std::vector<uint32_t>& out) const;
+  unsigned GetFileGroups(const std::vector<uint32_t>& fileOids, std::vector<uint32_t>& out) const;
+  unsigned SetFileGroups(uint32_t fileOid, const std::vector<uint32_t>& groups, bool additive);
+  unsigned RemoveImageFromGroups(uint32_t fileOid, uint32_t parentOid);
+  unsigned RemoveImageFromGroups(const std::vector<uint32_t>& fileOids, uint32_t parentOid);
+  unsigned AddGroup(const CVXGroup& group);
+  unsigned UpdateGroup(const CVXGroup& group);
+  unsigned RemoveGroup(uint32_t oid);
+  unsigned ReorderGroup(uint32_t oid, uint32_t targetOid, bool before);
+  unsigned GetDynamicGroups(std::vector<uint32_t>& out) const;
+  uint32_t GetInteractiveGroup() const { return interactiveGroup_; }
+  // Files of no top-level category; 15014 when a formula comes back here through "@Unassigned".
+  unsigned GetUnassignedImages(CBitVector& bits);
+  // OID of the stored persistent selection of that name; 10020 when there is none.
+  unsigned GetPersSelOid(const std::string& name, uint32_t& oid);
   size_t NumberOfGroups() const { return groups_.size(); }
 
   // ---- Persistent selections and file transforms, as far as file and folder changes reach
@@ -171,6 +198,9 @@ class CVXCatalog : public CVXBase {
   void ConnectChildren();
   unsigned _RecurseFolder(uint32_t oid, CBitVector& bits);
   unsigned _RecurseFolderChildren(uint32_t oid, std::vector<uint32_t>& out);
+  unsigned _RecurseGroup(uint32_t oid, CBitVector& bits);
+  CVXGroup* GetGroup(uint32_t oid);
+  const CVXGroup* GetGroup(uint32_t oid) const;
   void SetDirty(bool dirty) { dirty_ = dirty; }
 
  private:
@@ -190,6 +220,8 @@ class CVXCatalog : public CVXBase {
   unsigned MarkPersistantSelectionsDirty_(const char* key = nullptr);
   void RemoveFileFromPersistantSelections_(uint32_t oid);
   void RemapFolders_();
+  CBitVector GroupScope_(uint32_t parentOid) const;
+  void PrepareInteractiveGroup_();
   bool RemapFolder_(uint32_t oid, CVXFolder& folder);
   uint32_t ParentOidFor_(const std::string& uriText, const std::string& mediaID,
                          const std::string& mediaSerial) const;
@@ -223,4 +255,5 @@ class CVXCatalog : public CVXBase {
   bool persSelDirty_ = true;
   bool dirty_ = false;
   uint32_t interactiveGroup_ = 0;
+  bool inUnassignedCalc_ = false;  // re-entry guard of GetUnassignedImages
 };

@@ -151,8 +151,32 @@ unsigned CVXCatalog::LoadGroups() {
       if (group.Name() == "@Interactive") interactiveGroup_ = oid;
     }
     groups_ = std::move(loaded);
+    PrepareInteractiveGroup_();
   }
   Notify(cbmLoadProgress, 100, 0, nullptr);
   Notify(cbmLoadStageEnded, 0, 0, nullptr);
   return rc;
+}
+
+// The interactive selection never survives a close: its formula is emptied at every load. A
+// catalog without the category gets one.
+void CVXCatalog::PrepareInteractiveGroup_() {
+  // The map's record is cleared in place, so that a read-only store, which UpdateGroup leaves
+  // alone, forgets the formula as well.
+  if (CVXGroup* record = GetGroup(interactiveGroup_); record && interactiveGroup_ != 0) {
+    record->SetExpression(*this, "");
+    CVXGroup copy = *record;
+    UpdateGroup(copy);
+    return;
+  }
+  CVXGroup group(GenerateGroupOID());
+  group.Name() = "@Interactive";
+  group.Description() =
+      "This special category represents the result of your @interactive selection. Drag "
+      "categories to the Category Builder window to define the contents of this category.";
+  group.Parent() = 0;
+  group.Flags() = gfSystem | gfSealed;
+  group.SortSequence() = -2;
+  // A read-only store cannot take it; the catalog opens all the same.
+  if (AddGroup(group) == VX_OK) interactiveGroup_ = group.Oid();
 }

@@ -1,0 +1,108 @@
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "VXEngine.h"
+#include "VXGroup.h"
+#include "VXGroupParser.h"
+#include "VXResult.h"
+#include "vxcatalog.h"
+#include "vxcatalog_fixture.h"
+#include "vxtest.h"
+
+namespace {
+
+using CatalogGroups = vxtest::CatalogFixture;
+
+TEST_F(CatalogGroups, TreeNamesAndParentLinks) {
+  uint32_t a = AddGroup("A");
+  uint32_t b = AddGroup("B", a);
+  uint32_t top = AddGroup("Top", VX_ALL_GROUP_OID);
+  EXPECT_EQ(Group(top).Parent(), 0u) << "a parent of @All means no parent";
+  EXPECT_EQ(Group(a).Children(), std::vector<uint32_t>{b});
+  std::string name;
+  ASSERT_EQ(Cat().GetFullGroupName(b, name), VX_OK);
+  EXPECT_EQ(name, "A.B");
+  EXPECT_EQ(Cat().LookupGroup("A.B"), b);
+  EXPECT_EQ(Cat().LookupGroup("a.b"), 0u);
+  std::vector<uint32_t> all;
+  Cat().GetGroups(all);
+  EXPECT_EQ(all, (std::vector<uint32_t>{a, b, top, VX_ALL_GROUP_OID}));
+
+  CVXGroup changed = Group(top);
+  changed.Parent() = VX_ALL_GROUP_OID;
+  ASSERT_EQ(Cat().UpdateGroup(changed), VX_OK);
+  Reopen();
+  EXPECT_EQ(Group(top).Parent(), VX_ALL_GROUP_OID) << "UpdateGroup stores the value as given";
+  EXPECT_EQ(Group(a).Children(), std::vector<uint32_t>{b});
+
+  ASSERT_EQ(Cat().RemoveGroup(a), VX_OK);
+  CVXGroup gone;
+  EXPECT_EQ(Cat().LookupGroup(b, gone), VX_NOT_FOUND) << "children go with their parent";
+  EXPECT_EQ(Cat().AddGroup(CVXGroup(0)), VX_NOT_FOUND);
+  EXPECT_EQ(Cat().AddGroup(Group(top)), VX_ALREADY_PRESENT);
+}
+
+TEST_F(CatalogGroups, ChildCyclesEndWithCircular) {
+  uint32_t a = AddGroup("a");
+  uint32_t b = AddGroup("b", a);
+  CVXGroup loop = Group(b);
+  loop.Children().push_back(a);  // b -> a -> b
+  ASSERT_EQ(Cat().UpdateGroup(loop), VX_OK);
+  std::vector<uint32_t> out;
+  EXPECT_EQ(Cat().GetGroupChildrenRecursive(a, out), VX_FORMULA_CIRCULAR);
+  EXPECT_EQ(out, (std::vector<uint32_t>{b, a}));
+  bool depends = false;
+  EXPECT_EQ(Cat().GroupDependsOn(a, b, depends), VX_FORMULA_CIRCULAR);
+  // Already seen entries are not descended into.
+  std::vector<uint32_t> seen = {b};
+  EXPECT_EQ(Cat().GetGroupChildrenRecursive(a, seen), VX_FORMULA_CIRCULAR);
+  EXPECT_EQ(seen, std::vector<uint32_t>{b});
+}
+
+TEST_F(CatalogGroups, ReorderSiblings) {
+  uint32_t p = AddGroup("p");
+  uint32_t a = AddGroup("a", p);
+  uint32_t b = AddGroup("b", p);
+  uint32_t c = AddGroup("c", p);
+  uint32_t x = AddGroup("x");
+  ASSERT_EQ(Cat().ReorderGroup(c, a, true), VX_OK);
+  EXPECT_EQ(Group(p).Children(), (std::vector<uint32_t>{c, a, b}));
+  EXPECT_EQ(Group(c).SortSequence(), 0);
+  EXPECT_EQ(Group(b).SortSequence(), 2);
+  ASSERT_EQ(Cat().ReorderGroup(c, a, false), VX_OK);
+  EXPECT_EQ(Group(p).Children(), (std::vector<uint32_t>{a, c, b}));
+  EXPECT_EQ(Cat().ReorderGroup(c, x, true), VX_NOT_FOUND);
+  EXPECT_EQ(Group(p).Children(), (std::vector<uint32_t>{a, c, b}));
+  ASSERT_EQ(Cat().ReorderGroup(p, 0, false), VX_OK);
+  for (uint32_t o : {a, b, c}) EXPECT_EQ(Group(o).SortSequence(), -1);
+  EXPECT_EQ(Group(p).Children(), (std::vector<uint32_t>{a, c, b}));
+}
+
+TEST_F(CatalogGroups, FileAssignment) {
+  uint32_t a = AddGroup("a");
+  uint32_t b = AddGroup("b");
+  ASSERT_EQ(Cat().SetFileGroups(7, {a, b}, true), VX_OK);
+  std::vector<uint32_t> groups;
+  Cat().GetFileGroups(7, groups);
+  EXPECT_EQ(groups, (std::vector<uint32_t>{a, b}));
+  Cat().GetFileGroups(std::vector<uint32_t>{3, 7}, groups);
+  EXPECT_EQ(groups, (std::vector<uint32_t>{a, b}));
+  ASSERT_EQ(Cat().SetFileGroups(7, {b}, false), VX_OK);
+  Cat().GetFileGroups(7, groups);
+  EXPECT_EQ(groups, std::vector<uint32_t>{b});
+  ASSERT_EQ(Cat().SetFileGroups(7, {}, false), VX_OK);
+  Cat().GetFileGroups(7, groups);
+  EXPECT_TRUE(groups.empty());
+  // Exclusive assignment takes the file out of every other category first.
+  Cat().SetFileGroups(9, {a}, true);
+  CVXGroup exclusive = Group(b);
+  exclusive.Flags() |= gfExclusiveAll;
+  ASSERT_EQ(Cat().UpdateGroup(exclusive), VX_OK);
+  Cat().SetFileGroups(9, {b}, true);
+  Cat().GetFileGroups(9, groups);
+  EXPECT_EQ(groups, std::vector<uint32_t>{b});
+}
+
+}  // namespace

@@ -1,0 +1,83 @@
+// Catalog operations that ask categories about their formulas: references, dependencies and
+// calculated content.
+
+#include <algorithm>
+
+#include "VXGroupParser.h"
+#include "vxcatalog_frame.h"
+
+unsigned CVXCatalog::GetGroupReferrers(uint32_t oid, unsigned refType, std::vector<uint32_t>& out) {
+  out.clear();
+  if (!GetGroup(oid)) return VX_NOT_FOUND;
+  for (const auto& [other, group] : groups_) {
+    if (other == oid) continue;
+    CVXGroup copy = group;
+    if (copy.HasReference(oid, static_cast<ERefType>(refType))) out.push_back(other);
+  }
+  return VX_OK;
+}
+
+// True in `depends` when `otherOid` lies below `oid` or is named by the formula of `oid` or of
+// anything below it.
+unsigned CVXCatalog::GroupDependsOn(uint32_t oid, uint32_t otherOid, bool& depends) {
+  depends = false;
+  std::vector<uint32_t> below;
+  if (unsigned rc = GetGroupChildrenRecursive(oid, below); rc != VX_OK) return rc;
+  if (std::find(below.begin(), below.end(), otherOid) != below.end()) {
+    depends = true;
+    return VX_OK;
+  }
+  for (uint32_t child : below) {
+    unsigned rc = GroupDependsOn(child, otherOid, depends);
+    if (rc != VX_OK || depends) return rc;
+  }
+  if (const CVXGroup* group = GetGroup(oid)) {
+    CVXGroup copy = *group;
+    depends = copy.HasGroupReference(*this, otherOid);
+  }
+  return VX_OK;
+}
+
+unsigned CVXCatalog::GetGroupImages(uint32_t oid, std::vector<uint32_t>& out) {
+  // Assignment, not the copy constructor: a category stored in error must stay refused.
+  CVXGroup copy;
+  if (LookupGroup(oid, copy) != VX_OK) return VX_NOT_FOUND;
+  return copy.Calculate(*this, out);
+}
+
+// The files that no top-level category holds, by formula or by hand. A formula that names
+// "@Unassigned" comes back here; the guard answers it with 15014 instead of recursing.
+unsigned CVXCatalog::GetUnassignedImages(CBitVector& bits) {
+  bits.Clear();
+  if (inUnassignedCalc_) return VX_FORMULA_CIRCULAR;
+  inUnassignedCalc_ = true;
+  unsigned rc = VX_OK;
+  CBitVector assigned;
+  CBitVector work;
+  for (const auto& [oid, group] : groups_) {
+    CVXGroup copy = group;
+    if (copy.Parent() != 0 || oid == VX_ALL_GROUP_OID || copy.IsFTIRoot() ||
+        copy.Expression(*this).find("@Unassigned") != std::string::npos) {
+      continue;
+    }
+    uint32_t flags = copy.Flags();
+    copy.Flags() &= ~uint32_t{gfNoChildImages};
+    unsigned r = copy.Calculate(*this, work);
+    copy.Flags() = flags;
+    if (r == VX_OK) {
+      assigned |= work;
+    } else if (r != VX_FORMULA_CIRCULAR) {
+      VX_LOGF(Log_(), 1, "Failed to parse category %s with error %lu", copy.Name().c_str(),
+              static_cast<unsigned long>(r));
+      rc = r;
+      break;
+    }
+  }
+  if (rc == VX_OK) {
+    GetFiles(work);
+    if (!assigned.IsEmpty()) work.AndNot(assigned);
+    bits = work;
+  }
+  inUnassignedCalc_ = false;
+  return rc;
+}
