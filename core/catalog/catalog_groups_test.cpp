@@ -106,3 +106,57 @@ TEST_F(CatalogGroups, FileAssignment) {
 }
 
 }  // namespace
+
+namespace {
+
+TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
+  uint32_t root = AddGroup("Models");
+  CVXGroup r = Group(root);
+  r.FTITag() = "EXIF:Model";
+  Store(r);
+  uint32_t child = AddGroup("Canon", root);
+  CVXGroup c = Group(child);
+  c.FTITag() = "EXIF:Model";
+  c.FTIPattern() = "Canon";
+  Store(c);
+  uint32_t byHand = AddGroup("Mine", root);
+  uint32_t other = AddGroup("Keywords");
+  CVXGroup o = Group(other);
+  o.FTITag() = "dc:subject";
+  Store(o);
+
+  std::vector<uint32_t> roots;
+  Cat().GetDynamicGroups(roots);
+  EXPECT_EQ(roots, (std::vector<uint32_t>{root, other}));
+  ASSERT_EQ(Cat().InvalidateDynamicGroups(0, "exif"), VX_OK);
+  EXPECT_TRUE(Group(root).NeedsRecalc());
+  EXPECT_TRUE(Group(child).NeedsRecalc());
+  EXPECT_FALSE(Group(other).NeedsRecalc());
+  EXPECT_FALSE(Group(byHand).NeedsRecalc());
+
+  ASSERT_EQ(Cat().ClearDynamicGroup(root), VX_OK);
+  EXPECT_FALSE(Group(root).IsFTI());
+  CVXGroup gone;
+  EXPECT_EQ(Cat().LookupGroup(child, gone), VX_NOT_FOUND);
+  EXPECT_EQ(Group(root).Children(), std::vector<uint32_t>{byHand});
+  EXPECT_EQ(Cat().ClearDynamicGroup(12345), VX_NOT_FOUND);
+}
+
+}  // namespace
+
+namespace {
+
+TEST_F(CatalogGroups, FolderReferencesMoveToAnotherFolder) {
+  uint32_t from = AddFolder("c:/old/");
+  uint32_t to = AddFolder("c:/new/");
+  uint32_t cat = AddGroup("ByFolder");
+  CVXGroup g = Group(cat);
+  ASSERT_EQ(g.SetExpression(Cat(), "\"Folder@c:/old/<VOL.1234>\"").code, VX_OK);
+  Store(g);
+  ASSERT_EQ(Cat().MoveFolderReferences(from, to), VX_OK);
+  EXPECT_NE(Group(cat).Expression(Cat()).find("c:/new/"), std::string::npos);
+  EXPECT_TRUE(Group(cat).HasReference(to, refFolder));
+  EXPECT_FALSE(Group(cat).HasReference(from, refFolder));
+}
+
+}  // namespace

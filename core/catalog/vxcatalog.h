@@ -124,6 +124,8 @@ class CVXCatalog : public CVXBase {
   unsigned RemoveFolder(uint32_t oid, bool recursive);
   unsigned RenameFolder(uint32_t oid, const CVXURI& newURI, const std::string& newMediaID,
                         const std::string& newMediaSerial);
+  // Points folder references of every formula from `oldOid` to `newOid`; the host decides when.
+  unsigned MoveFolderReferences(uint32_t oldOid, uint32_t newOid);
 
   // ---- Categories. Callers take a copy, change it and hand it back to UpdateGroup.
   unsigned LookupGroup(uint32_t oid, CVXGroup& out) const;
@@ -148,6 +150,11 @@ class CVXCatalog : public CVXBase {
   unsigned ReorderGroup(uint32_t oid, uint32_t targetOid, bool before);
   unsigned GetDynamicGroups(std::vector<uint32_t>& out) const;
   uint32_t GetInteractiveGroup() const { return interactiveGroup_; }
+  // Marks data-driven categories for a new query: all of them, or `oid`, and with `tag` only
+  // those whose tag holds it (ignoring case). Always 10001.
+  unsigned InvalidateDynamicGroups(uint32_t oid, const char* tag);
+  // Turns a data-driven root into an ordinary category and removes its data-driven children.
+  unsigned ClearDynamicGroup(uint32_t oid);
   // Files of no top-level category; 15014 when a formula comes back here through "@Unassigned".
   unsigned GetUnassignedImages(CBitVector& bits);
   // OID of the stored persistent selection of that name; 10020 when there is none.

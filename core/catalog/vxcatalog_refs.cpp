@@ -5,6 +5,7 @@
 
 #include "VXGroupParser.h"
 #include "vxcatalog_frame.h"
+#include "xstring.h"
 
 unsigned CVXCatalog::GetGroupReferrers(uint32_t oid, unsigned refType, std::vector<uint32_t>& out) {
   out.clear();
@@ -79,5 +80,47 @@ unsigned CVXCatalog::GetUnassignedImages(CBitVector& bits) {
     bits = work;
   }
   inUnassignedCalc_ = false;
+  return rc;
+}
+
+unsigned CVXCatalog::MoveFolderReferences(uint32_t oldOid, uint32_t newOid) {
+  unsigned rc = VX_OK;
+  for (auto& [oid, group] : groups_) {
+    if (!group.UpdateFolderReference(*this, oldOid, newOid)) continue;
+    CVXGroup copy = group;
+    if ((rc = UpdateGroup(copy)) != VX_OK) {
+      VX_ERROR(Log_(), rc, "CVXCatalog::MoveFolderReferences");
+      break;
+    }
+  }
+  return rc;
+}
+
+unsigned CVXCatalog::InvalidateDynamicGroups(uint32_t oid, const char* tag) {
+  const std::string wanted = tag ? _mbsupr(std::string(tag)) : std::string();
+  for (auto& [goid, group] : groups_) {
+    if (!group.IsFTI() || group.NeedsRecalc() || (oid != 0 && goid != oid)) continue;
+    if (tag && _mbsupr(group.FTITag()).find(wanted) == std::string::npos) continue;
+    group.Flags() |= gfNeedsRecalc;
+    CVXGroup copy = group;
+    UpdateGroup(copy);
+  }
+  return VX_OK;
+}
+
+unsigned CVXCatalog::ClearDynamicGroup(uint32_t oid) {
+  CVXGroup copy;
+  if (LookupGroup(oid, copy) != VX_OK) return VX_NOT_FOUND;
+  copy.FTIPattern().clear();
+  copy.FTITag().clear();
+  copy.FTIType() = 0;
+  copy.Images().Clear();
+  unsigned rc = UpdateGroup(copy);
+  if (rc != VX_OK) return rc;
+  for (uint32_t child : copy.Children()) {
+    CVXGroup c;
+    if (LookupGroup(child, c) != VX_OK) return VX_NOT_FOUND;
+    if (c.IsFTIChild() && (rc = RemoveGroup(child)) != VX_OK) return rc;
+  }
   return rc;
 }
