@@ -9,7 +9,7 @@ jobs=$(nproc)
 fuzz_seconds=${VX_FUZZ_SECONDS:-10}
 
 echo "== GCC build and tests"
-cmake -G Ninja -S . -B build/gcc -DCMAKE_BUILD_TYPE=RelWithDebInfo -DVX_BUILD_BENCH=ON >/dev/null
+cmake -G Ninja -S . -B build/gcc -DCMAKE_BUILD_TYPE=Release -DVX_BUILD_BENCH=ON >/dev/null
 ninja -C build/gcc -j"$jobs"
 (cd build/gcc && ctest -j"$jobs" --output-on-failure)
 

@@ -208,21 +208,6 @@ unsigned CVXCatalog::StoreFile(uint32_t oid) { return StoreRecord_(rtFile, files
 unsigned CVXCatalog::StoreFolder(uint32_t oid) { return StoreRecord_(rtFolder, folders_, oid); }
 unsigned CVXCatalog::StoreGroup(uint32_t oid) { return StoreRecord_(rtGroup, groups_, oid); }
 
-// Reads one record into `object` through a memory file; a record that does not read gives its
-// code and leaves `object` as it was.
-template <typename T>
-unsigned CVXCatalog::LoadRecord_(ERecordType type, uint32_t oid, T& object) {
-  CVXMemFile file;
-  unsigned rc = store_.Get(CQRLBlobDB::SSelector(type, oid), file);
-  if (rc != VX_OK) return rc;
-  try {
-    file >> object;
-  } catch (...) {
-    return VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
-  }
-  return VX_OK;
-}
-
 unsigned CVXCatalog::LoadFile(uint32_t oid, CVXCatFile& file) {
   return LoadRecord_(rtFile, oid, file);
 }

@@ -48,3 +48,18 @@ unsigned CVXCatalog::StoreRecord_(ERecordType type, const std::map<uint32_t, T>&
   if (rc != VX_OK) VX_ERROR(Log_(), rc, "Storing record");
   return rc;
 }
+
+// Reads one record into `object` through a memory file; a record that does not read gives its
+// code and leaves `object` as it was.
+template <typename T>
+unsigned CVXCatalog::LoadRecord_(ERecordType type, uint32_t oid, T& object) {
+  CVXMemFile file;
+  unsigned rc = store_.Get(CQRLBlobDB::SSelector(type, oid), file);
+  if (rc != VX_OK) return rc;
+  try {
+    file >> object;
+  } catch (...) {
+    return VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
+  }
+  return VX_OK;
+}
