@@ -109,6 +109,18 @@ int xstring_comparenocase(const std::string& a, const std::string& b) {
   return CompareFolded(a.data(), a.size(), b.data(), b.size(), SIZE_MAX);
 }
 
+std::string xstring_foldkey(const std::string& text) {
+  std::string key;
+  key.reserve(text.size() * 4);
+  const char* p = text.data();
+  const char* end = p + text.size();
+  while (p != end) {
+    int32_t k = NextFoldedKey(p, end);
+    key.append(reinterpret_cast<const char*>(&k), sizeof k);
+  }
+  return key;
+}
+
 int _mbsicmp(const char* a, const char* b) {
   a = OrEmpty(a);
   b = OrEmpty(b);

@@ -21,6 +21,9 @@ void Trim(std::string& text, XStringTrim where = xstBoth);
 // Case-insensitive comparisons by Unicode simple case folding: 0 when equal, otherwise the sign
 // orders a before or after b (by folded code point; a stray byte orders after every character).
 int xstring_comparenocase(const std::string& a, const std::string& b);
+// A key for hashing and equality under the same folding: two texts give equal keys exactly when
+// xstring_comparenocase finds them equal. Not an order, and not text.
+std::string xstring_foldkey(const std::string& text);
 int _mbsicmp(const char* a, const char* b);
 // Compares at most n characters.
 int _mbsnicmp(const char* a, const char* b, size_t n);

@@ -152,3 +152,14 @@ TEST(XString, CharacterClassesAndUpperCase) {
 }
 
 }  // namespace
+
+TEST(XString, FoldKeysAreEqualExactlyWhenTextsCompareEqual) {
+  const std::string texts[] = {"Müller.JPG", "MÜLLER.jpg", "muller.jpg", "é", "É",  "e",
+                               "a\xFF",      "A\xFF",      "a\xFE",      "",  "ab", "a"};
+  for (const std::string& a : texts) {
+    for (const std::string& b : texts) {
+      EXPECT_EQ(xstring_foldkey(a) == xstring_foldkey(b), xstring_comparenocase(a, b) == 0)
+          << a << " / " << b;
+    }
+  }
+}

@@ -227,6 +227,7 @@ class CVXCatalog : public CVXBase {
   unsigned MarkPersistantSelectionsDirty_(const char* key = nullptr);
   void RemoveFileFromPersistantSelections_(uint32_t oid);
   void RemapFolders_();
+  static std::string ParentText_(const CVXURI& uri);
   CBitVector GroupScope_(uint32_t parentOid) const;
   void PrepareInteractiveGroup_();
   bool RemapFolder_(uint32_t oid, CVXFolder& folder);

@@ -3,6 +3,7 @@
 // kept by these operations, with the files' Folder fields.
 
 #include <ctime>
+#include <unordered_map>
 
 #include "VXGroupParser.h"
 #include "VXURI.h"
@@ -36,10 +37,16 @@ uint32_t CVXCatalog::FindParentFolder(const CVXFolder& folder) const {
 
 uint32_t CVXCatalog::FindParentFolder(const CVXURI& uri, const std::string& mediaID,
                                       const std::string& mediaSerial) const {
+  std::string text = ParentText_(uri);
+  return text.empty() ? 0 : ParentOidFor_(text, mediaID, mediaSerial);
+}
+
+// The URI text one path element up: the path without its final slash, cut behind its last "/".
+// Empty when there is no "/" left.
+std::string CVXCatalog::ParentText_(const CVXURI& uri) {
   std::string path = CVXURI::StripTrailer(uri.URIPath());
   size_t slash = path.rfind('/');
-  if (slash == std::string::npos) return 0;
-  return ParentOidFor_(path.substr(0, slash + 1), mediaID, mediaSerial);
+  return slash == std::string::npos ? std::string() : path.substr(0, slash + 1);
 }
 
 // The first folder, by OID, whose URI text is `parentText` on the medium given; the serial
@@ -150,12 +157,27 @@ uint32_t CVXCatalog::GetFolderThumb(uint32_t oid) const {
 // Visits folders in OID order, not by depth, so a parent added after its children picks them
 // up here. A failed store of the parent stores F's record under a file's selector, which finds
 // no file and writes nothing: the stored F keeps its parent link until the self test repairs it.
+//
+// The parent of each root is found through an index of every folder by folded medium and URI,
+// built once per pass, which finds the same folder as the scan by OID of FindParentFolder: the
+// pass changes no URI or medium, and the index keeps the lowest OID of equal keys.
 void CVXCatalog::ConnectChildren() {
   CQRLLogfile* log = Log_();
   VX_LOG(log, 4, "+ CVXCatalog::ConnectChildren");
+  auto key = [](const std::string& mediaID, const std::string& serial, const std::string& uri) {
+    return xstring_foldkey(mediaID) + '\n' + xstring_foldkey(serial) + '\n' + xstring_foldkey(uri);
+  };
+  std::unordered_map<std::string, uint32_t> index;
+  for (const auto& [oid, f] : folders_) {
+    index.emplace(key(f.MediaID(), f.MediaSerial(), f.URI().AsString()), oid);
+  }
   for (auto& [oid, f] : folders_) {
     if (f.ParentFolder() != 0) continue;
-    uint32_t p = FindParentFolder(f.URI(), f.MediaID(), f.MediaSerial());
+    uint32_t p = 0;
+    if (std::string text = ParentText_(f.URI()); !text.empty()) {
+      auto it = index.find(key(f.MediaID(), f.MediaSerial(), text));
+      if (it != index.end()) p = it->second;
+    }
     CVXFolder* parent = GetFolder(p);
     VX_LOGF(log, 4, "Connecting folder %lu(%s) to parent %lu(%s)", static_cast<unsigned long>(oid),
             f.URI().AsString().c_str(), static_cast<unsigned long>(p),
