@@ -390,11 +390,11 @@ SPrintfFormat CheckPrintfFormat(const char* format) {
       continue;
     }
     if (arg != EFormatArg::kNone) return result;
-    const char* spec = ++p;
+    const char* conversion = ++p;
     while (*p && std::strchr("-+ #0", *p)) ++p;
     if (!SkipDigits(p)) return result;
     if (*p == '.' && (++p, !SkipDigits(p))) return result;
-    out.append(spec, p);
+    out.append(conversion, p);
     while (*p && std::strchr("hlLqjzt", *p)) ++p;
     arg = ArgOf(*p);
     if (arg == EFormatArg::kInvalid) return result;
