@@ -78,6 +78,12 @@ class CVXEngine : public CVXBase {
   // or back them up. Additions for hosts.
   std::string StorePath(const char* ext) const;
 
+  // ---- Files and folders across the stores ----
+
+  // ---- Thumbnails, shape data, image properties, XMP and full text ----
+
+  // ---- Names, selections over the catalog, sort arrays, statistics, catalog forwards ----
+
  protected:
   bool Mutable() const;
   // True when the disk of the match store has at least `bytes` free, or the size is unknown.
@@ -90,6 +96,12 @@ class CVXEngine : public CVXBase {
   CQRLBlobDB& ThumbStore() { return thumbDB_; }
   CQRLBlobDB& SortStore() { return sortDB_; }
   SelTempStore& TemplateStore() { return templates_; }
+
+  // ---- protected: files and folders ----
+
+  // ---- protected: thumbnails and properties ----
+
+  // ---- protected: names, selections, statistics ----
 
   mutable std::recursive_mutex lock_;
 
@@ -119,4 +131,8 @@ class CVXEngine : public CVXBase {
   std::unique_ptr<CVXXMPDB> xmpDB_;
   CQRLBlobDB sortDB_;
   SelTempStore templates_;
+
+  // ---- state: thumbnails and properties ----
+
+  // ---- state: names, selections, statistics ----
 };

@@ -1,0 +1,1 @@
+#include "VXColor.h"
