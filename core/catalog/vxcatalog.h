@@ -164,7 +164,9 @@ class CVXCatalog : public CVXBase {
   // ---- Persistent selections and file transforms, as far as file and folder changes reach
   // them. `sel` null means every selection.
   unsigned InvalidatePersistantSelections(const CVXPersistantSelection* sel);
+  // `key` null tests for property selectors instead of one key.
   unsigned InvalidatePersistantSelectionsForKey(const char* key);
+  unsigned InvalidatePersistantSelectionsForProps();
   unsigned RemoveFileTransform(uint32_t oid);
 
   bool IsDirty() const { return dirty_; }

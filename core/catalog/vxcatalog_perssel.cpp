@@ -32,6 +32,11 @@ unsigned CVXCatalog::InvalidatePersistantSelectionsForKey(const char* key) {
   return rc;
 }
 
+// Selections with any property selector, for property changes through the engine.
+unsigned CVXCatalog::InvalidatePersistantSelectionsForProps() {
+  return InvalidatePersistantSelectionsForKey(nullptr);
+}
+
 unsigned CVXCatalog::MarkPersistantSelectionsDirty_(const char* /*key*/) {
   VX_ERROR(Log_(), VX_NOT_FOUND, "Persistent selections cannot be read by this build");
   return VX_NOT_FOUND;
