@@ -127,7 +127,8 @@ struct CQRLBlobDB::Impl {
   unsigned cacheKB = 0;
   std::map<uint16_t, SizeCache> sizeCaches;
   std::string lastError;
-  CSQLiteStatement get, size, set, remove, begin, commit;
+  // Reads select (id, data) or (id, length(data)), by one key or by a range of keys.
+  CSQLiteStatement get, size, getRange, sizeRange, set, remove, begin, commit;
 
   unsigned Fail(unsigned code, const char* op, const std::string& what);
   unsigned SqlFail(const char* op, const std::string& what);
@@ -147,7 +148,19 @@ struct CQRLBlobDB::Impl {
 
   template <class Sink>
   unsigned ReadRecord(const SSelector& sel, const char* op, Sink&& sink);
+  template <class Sink>
+  unsigned SinkBlob(CSQLiteStatement& st, const char* op, const SSelector& sel, Sink&& sink);
+  template <class Row>
+  unsigned StepOne(CSQLiteStatement& st, const SSelector& sel, const char* op, Row&& row);
+  static size_t RunLength(const std::vector<SSelector>& sels, size_t at);
+  template <class Row>
+  unsigned ForEachRecord(const std::vector<SSelector>& sels, CSQLiteStatement& one,
+                         CSQLiteStatement& range, const char* op, Row&& row);
+  template <class Row>
+  unsigned StepRange(CSQLiteStatement& st, const std::vector<SSelector>& sels, size_t at, size_t n,
+                     const char* op, Row&& row);
   unsigned ReadBatch(const std::vector<SSelector>& sels, uint8_t* out, uint64_t capacity);
+  unsigned SizeBatch(const std::vector<SSelector>& sels, uint64_t& total);
   unsigned RecordSize(const SSelector& sel, unsigned& bytes, const char* op);
 
   unsigned long SelfTestRecords(std::ostream& report, Callback callback, void* user,
@@ -257,8 +270,11 @@ bool CQRLBlobDB::Impl::PrepareStatements() {
     lastError = sqlite3_errmsg(db);
     return false;
   };
-  return prepare(get, "SELECT data FROM blobdb_records WHERE id=?1") &&
-         prepare(size, "SELECT length(data) FROM blobdb_records WHERE id=?1") &&
+  return prepare(get, "SELECT id, data FROM blobdb_records WHERE id=?1") &&
+         prepare(size, "SELECT id, length(data) FROM blobdb_records WHERE id=?1") &&
+         prepare(getRange, "SELECT id, data FROM blobdb_records WHERE id BETWEEN ?1 AND ?2") &&
+         prepare(sizeRange,
+                 "SELECT id, length(data) FROM blobdb_records WHERE id BETWEEN ?1 AND ?2") &&
          prepare(set, "INSERT OR REPLACE INTO blobdb_records(id, data) VALUES(?1, ?2)") &&
          prepare(remove, "DELETE FROM blobdb_records WHERE id=?1") && prepare(begin, "BEGIN") &&
          prepare(commit, "COMMIT");
@@ -267,7 +283,8 @@ bool CQRLBlobDB::Impl::PrepareStatements() {
 // Closes the connection. Without `force` it fails (and keeps the connection whole) while
 // statements prepared by others on Handle() are still alive.
 bool CQRLBlobDB::Impl::Disconnect(bool force) {
-  for (CSQLiteStatement* st : {&get, &size, &set, &remove, &begin, &commit}) st->Finalize();
+  for (CSQLiteStatement* st : {&get, &size, &getRange, &sizeRange, &set, &remove, &begin, &commit})
+    st->Finalize();
   if (!db) return true;
   if (sqlite3_close(db) != SQLITE_OK) {
     lastError = sqlite3_errmsg(db);
@@ -332,19 +349,84 @@ void CQRLBlobDB::Impl::UnloadCaches() {
 template <class Sink>
 unsigned CQRLBlobDB::Impl::ReadRecord(const SSelector& sel, const char* op, Sink&& sink) {
   if (!db) return Fail(VX_NOT_FOUND, op, "store not open");
-  get.Bind(1, Key(sel));
-  int rc = get.Step();
+  return StepOne(get, sel, op, [&](CSQLiteStatement& st) { return SinkBlob(st, op, sel, sink); });
+}
+
+// Hands the blob of the current row (column 1) to `sink`. A null pointer for a non-empty blob
+// is SQLite out of memory.
+template <class Sink>
+unsigned CQRLBlobDB::Impl::SinkBlob(CSQLiteStatement& st, const char* op, const SSelector& sel,
+                                    Sink&& sink) {
+  const void* data = st.Blob(1);
+  size_t bytes = static_cast<size_t>(st.Bytes(1));
+  if (!data && bytes) return Fail(VX_NOT_FOUND, op, SelText(sel) + ": out of memory");
+  return sink(static_cast<const uint8_t*>(data), bytes);
+}
+
+// Steps a statement keyed by one record. `row` sees the row; a missing record is 10020.
+template <class Row>
+unsigned CQRLBlobDB::Impl::StepOne(CSQLiteStatement& st, const SSelector& sel, const char* op,
+                                   Row&& row) {
+  st.Bind(1, Key(sel));
+  int rc = st.Step();
   unsigned result = VX_NOT_FOUND;
   if (rc == SQLITE_ROW) {
-    const void* data = get.Blob(0);
-    size_t bytes = static_cast<size_t>(get.Bytes(0));
-    result = data || !bytes ? sink(static_cast<const uint8_t*>(data), bytes)
-                            : Fail(VX_NOT_FOUND, op, SelText(sel) + ": out of memory");
+    result = row(st);
   } else if (rc != SQLITE_DONE) {
     lastError = sqlite3_errmsg(db);
     result = SqlFail(op, SelText(sel));
   }
-  get.Reset();
+  st.Reset();
+  return result;
+}
+
+// Number of selectors from `at` on whose keys rise by one: such a run is read with one range
+// scan instead of a lookup per record.
+size_t CQRLBlobDB::Impl::RunLength(const std::vector<SSelector>& sels, size_t at) {
+  size_t n = 1;
+  while (at + n < sels.size() && Key(sels[at + n]) == Key(sels[at + n - 1]) + 1) ++n;
+  return n;
+}
+
+// Walks `sels` in order and calls `row(index, statement)` for each record, through `one` for
+// scattered keys and `range` (keys BETWEEN ?1 AND ?2) for runs. The first missing record ends
+// the walk with 10020, as a lookup would.
+template <class Row>
+unsigned CQRLBlobDB::Impl::ForEachRecord(const std::vector<SSelector>& sels, CSQLiteStatement& one,
+                                         CSQLiteStatement& range, const char* op, Row&& row) {
+  constexpr size_t kMinRun = 8;  // below this a range scan costs more than it saves
+  for (size_t at = 0; at < sels.size();) {
+    size_t n = RunLength(sels, at);
+    unsigned rc = VX_OK;
+    if (n < kMinRun) {
+      n = 1;
+      rc = StepOne(one, sels[at], op, [&](CSQLiteStatement& st) { return row(at, st); });
+    } else {
+      rc = StepRange(range, sels, at, n, op, row);
+    }
+    if (rc != VX_OK) return rc;
+    at += n;
+  }
+  return VX_OK;
+}
+
+template <class Row>
+unsigned CQRLBlobDB::Impl::StepRange(CSQLiteStatement& st, const std::vector<SSelector>& sels,
+                                     size_t at, size_t n, const char* op, Row&& row) {
+  st.Bind(1, Key(sels[at])).Bind(2, Key(sels[at + n - 1]));
+  unsigned result = VX_OK;
+  for (size_t i = at; i < at + n && result == VX_OK; ++i) {
+    int rc = st.Step();
+    if (rc == SQLITE_ROW && st.Int64(0) == Key(sels[i])) {
+      result = row(i, st);
+    } else if (rc == SQLITE_ROW || rc == SQLITE_DONE) {
+      result = VX_NOT_FOUND;  // a gap in the run: that record is missing
+    } else {
+      lastError = sqlite3_errmsg(db);
+      result = SqlFail(op, SelText(sels[i]));
+    }
+  }
+  st.Reset();
   return result;
 }
 
@@ -353,17 +435,38 @@ unsigned CQRLBlobDB::Impl::ReadBatch(const std::vector<SSelector>& sels, uint8_t
   if (!db) return Fail(VX_NOT_FOUND, "Get", "store not open");
   ReadTransaction transaction(*this);
   uint64_t used = 0;
-  for (const SSelector& sel : sels) {
-    unsigned rc = ReadRecord(sel, "Get", [&](const uint8_t* data, size_t bytes) {
+  return ForEachRecord(sels, get, getRange, "Get", [&](size_t i, CSQLiteStatement& st) {
+    return SinkBlob(st, "Get", sels[i], [&](const uint8_t* data, size_t bytes) {
       if (bytes > capacity - used)
-        return Fail(VX_NOT_FOUND, "Get", "buffer too small at " + SelText(sel));
+        return Fail(VX_NOT_FOUND, "Get", "buffer too small at " + SelText(sels[i]));
       if (bytes) std::memcpy(out + used, data, bytes);
       used += bytes;
       return unsigned{VX_OK};
     });
-    if (rc != VX_OK) return rc;
+  });
+}
+
+unsigned CQRLBlobDB::Impl::SizeBatch(const std::vector<SSelector>& sels, uint64_t& total) {
+  if (!db) return Fail(VX_NOT_FOUND, "GetSize", "store not open");
+  ReadTransaction transaction(*this);
+  total = 0;
+  auto add = [&](unsigned bytes) {
+    total += bytes;
+    return total > UINT_MAX ? Fail(VX_NOT_FOUND, "GetSize", "sum exceeds 32 bits")
+                            : unsigned{VX_OK};
+  };
+  if (!sels.empty() && LoadedCache(sels.front().Type)) {
+    for (const SSelector& sel : sels) {
+      unsigned bytes = 0;
+      unsigned rc = RecordSize(sel, bytes, "GetSize");
+      if (rc == VX_OK) rc = add(bytes);
+      if (rc != VX_OK) return rc;
+    }
+    return VX_OK;
   }
-  return VX_OK;
+  return ForEachRecord(sels, size, sizeRange, "GetSize", [&](size_t, CSQLiteStatement& st) {
+    return add(static_cast<unsigned>(st.Int64(1)));
+  });
 }
 
 unsigned CQRLBlobDB::Impl::RecordSize(const SSelector& sel, unsigned& bytes, const char* op) {
@@ -374,13 +477,10 @@ unsigned CQRLBlobDB::Impl::RecordSize(const SSelector& sel, unsigned& bytes, con
     bytes = it->second;
     return VX_OK;
   }
-  size.Bind(1, Key(sel));
-  int rc = size.Step();
-  if (rc == SQLITE_ROW) bytes = static_cast<unsigned>(size.Int64(0));
-  if (rc != SQLITE_ROW && rc != SQLITE_DONE) lastError = sqlite3_errmsg(db);
-  size.Reset();
-  if (rc == SQLITE_ROW) return VX_OK;
-  return rc == SQLITE_DONE ? unsigned{VX_NOT_FOUND} : SqlFail(op, SelText(sel));
+  return StepOne(size, sel, op, [&](CSQLiteStatement& st) {
+    bytes = static_cast<unsigned>(st.Int64(1));
+    return unsigned{VX_OK};
+  });
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -517,20 +617,10 @@ unsigned CQRLBlobDB::Get(const std::vector<SSelector>& sels, void* buffer, uint6
 }
 
 unsigned CQRLBlobDB::GetSize(const std::vector<SSelector>& sels, unsigned& size) {
-  Impl& s = *impl_;
-  size = 0;
-  if (!s.db) return s.Fail(VX_NOT_FOUND, "GetSize", "store not open");
-  Impl::ReadTransaction transaction(s);
   uint64_t total = 0;
-  for (const SSelector& sel : sels) {
-    unsigned bytes = 0;
-    unsigned rc = s.RecordSize(sel, bytes, "GetSize");
-    if (rc != VX_OK) return rc;
-    total += bytes;
-    if (total > UINT_MAX) return s.Fail(VX_NOT_FOUND, "GetSize", "sum exceeds 32 bits");
-  }
-  size = static_cast<unsigned>(total);
-  return VX_OK;
+  unsigned rc = impl_->SizeBatch(sels, total);
+  size = rc == VX_OK ? static_cast<unsigned>(total) : 0;
+  return rc;
 }
 
 bool CQRLBlobDB::HasRecord(const SSelector& sel) {
@@ -557,7 +647,7 @@ unsigned CQRLBlobDB::GetOids(uint16_t type, std::vector<uint32_t>& oids, bool so
   if (Impl::SizeCache* cache = s.LoadedCache(type)) {
     oids.reserve(cache->sizes.size());
     for (const auto& entry : cache->sizes) oids.push_back(entry.first);
-    if (sorted) std::sort(oids.begin(), oids.end());
+    if (sorted && !std::is_sorted(oids.begin(), oids.end())) std::sort(oids.begin(), oids.end());
     return VX_OK;
   }
   // The key range comes back in key order, so this answer is always sorted.
@@ -595,7 +685,8 @@ unsigned CQRLBlobDB::GetNumberOfRecords(uint16_t type, unsigned& count) {
 unsigned CQRLBlobDB::OptimizeOidsForSequentialAccess(uint16_t, std::vector<uint32_t>& oids) {
   if (!impl_->db)
     return impl_->Fail(VX_NOT_FOUND, "OptimizeOidsForSequentialAccess", "store not open");
-  std::sort(oids.begin(), oids.end());
+  // Key order is file order; lists from GetOids arrive in it already.
+  if (!std::is_sorted(oids.begin(), oids.end())) std::sort(oids.begin(), oids.end());
   return VX_OK;
 }
 

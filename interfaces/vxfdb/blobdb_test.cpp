@@ -151,6 +151,13 @@ TEST_F(BlobDBTest, BatchReadsAndCachesAgree) {
     ASSERT_EQ(Put(db, {2, oid}, oid * 5 % 1700), VX_OK);
     sels.push_back({2, oid});
   }
+  // Runs of consecutive keys take the range path; 1020 leaves a gap in the stored run.
+  for (uint32_t oid = 1001; oid <= 1030; ++oid) {
+    if (oid != 1020) {
+      ASSERT_EQ(Put(db, {2, oid}, oid * 5 % 1700), VX_OK);
+    }
+  }
+  for (uint32_t oid = 1001; oid < 1020; ++oid) sels.push_back({2, oid});
   ASSERT_EQ(Put(db, {3, 1}, 99), VX_OK);
   sels.insert(sels.begin() + 5, Sel{3, 1});
   std::string plain = Observe(db, sels);
@@ -171,6 +178,10 @@ TEST_F(BlobDBTest, BatchReadsAndCachesAgree) {
   unsigned size = 0;
   EXPECT_EQ(db.GetSize(withMissing, size), VX_NOT_FOUND);
   EXPECT_EQ(db.Get(withMissing, guarded.data()), VX_NOT_FOUND);
+  std::vector<Sel> acrossGap;
+  for (uint32_t oid = 1010; oid <= 1030; ++oid) acrossGap.push_back({2, oid});
+  EXPECT_EQ(db.GetSize(acrossGap, size), VX_NOT_FOUND);
+  EXPECT_EQ(db.Get(acrossGap, guarded.data(), guarded.size()), VX_NOT_FOUND);
 
   db.EnableCaching(true, 0);
   EXPECT_TRUE(db.CachingEnabled());
