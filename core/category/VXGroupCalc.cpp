@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <exception>
 
+#include "FTIText.h"
 #include "VXEngine.h"
 #include "VXException.h"
 #include "VXGroup.h"
@@ -122,11 +123,12 @@ unsigned CVXGroup::CalculateDataDriven_(const CVXGroup& group, CVXCatalog& catal
   }
   CVXEngine* engine = catalog.GetEngine();
   if (!engine) return VX_NOT_FOUND;
-  // The index's exact mode compares each (cut) tag value with the pattern as it stands, the
-  // form in which the build stored it, so the pattern goes in unquoted.
+  // The pattern goes to the index as a quoted literal; an empty one asks for every file that
+  // has the tag.
+  std::string query = group.ftiPattern_.empty() ? std::string() : FTIText::Quote(group.ftiPattern_);
   std::vector<uint32_t> oids;
-  if (engine->XMPDB().FTIQuery(group.ftiTag_, group.ftiPattern_, CVXXMPDB::fqExact, oids,
-                               group.ftiSubStrStart_, group.ftiSubStrLen_) != 0) {
+  if (engine->XMPDB().FTIQuery(group.ftiTag_, query, CVXXMPDB::fqExact, oids, group.ftiSubStrStart_,
+                               group.ftiSubStrLen_) != 0) {
     return VX_NOT_FOUND;
   }
   out.Clear();

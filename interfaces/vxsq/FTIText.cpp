@@ -54,6 +54,29 @@ std::string SubString(std::string_view text, int32_t start, int32_t len) {
   return std::string(text.substr(begin, end - begin));
 }
 
+std::string Quote(std::string_view text) {
+  std::string quoted = "\"";
+  for (char c : text) {
+    if (c == '"') quoted += '"';
+    quoted += c;
+  }
+  return quoted + '"';
+}
+
+std::optional<std::string> Unquote(std::string_view text) {
+  if (text.size() < 2 || text.front() != '"' || text.back() != '"') return std::nullopt;
+  std::string plain;
+  for (size_t i = 1; i + 1 < text.size(); ++i) {
+    if (text[i] == '"') {
+      // Inside, quotes come in pairs; the closing quote cannot complete one.
+      if (i + 2 >= text.size() || text[i + 1] != '"') return std::nullopt;
+      ++i;
+    }
+    plain += text[i];
+  }
+  return plain;
+}
+
 std::string PrefixQuery(std::string_view text) {
   std::string query;
   size_t i = 0;
@@ -62,12 +85,10 @@ std::string PrefixQuery(std::string_view text) {
       ++i;
       continue;
     }
-    query += query.empty() ? "\"" : " \"";
-    for (; i < text.size() && !IsSpace(text[i]); ++i) {
-      if (text[i] == '"') query += '"';
-      query += text[i];
-    }
-    query += "\"*";
+    size_t end = i;
+    while (end < text.size() && !IsSpace(text[end])) ++end;
+    query += (query.empty() ? "" : " ") + Quote(text.substr(i, end - i)) + "*";
+    i = end;
   }
   return query;
 }

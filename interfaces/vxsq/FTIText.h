@@ -18,6 +18,10 @@ size_t CharCount(std::string_view text);
 // Characters [start, start + len) of text; start < 0 counts as 0, len <= 0 means to the end,
 // a start beyond the end gives "".
 std::string SubString(std::string_view text, int32_t start, int32_t len);
+// text between double quotes, its double quotes doubled: the literal form of a query pattern.
+std::string Quote(std::string_view text);
+// The inverse of Quote; none when text is not in that form.
+std::optional<std::string> Unquote(std::string_view text);
 // An FTS5 query requiring every blank-separated word of text as a word prefix: `"w1"* "w2"*`,
 // double quotes doubled inside. "" when text holds no word.
 std::string PrefixQuery(std::string_view text);

@@ -24,8 +24,14 @@ class CSQLiteStatement {
   bool Ok() const { return stmt_ != nullptr; }
   sqlite3_stmt* Get() const { return stmt_; }
 
-  CSQLiteStatement& Bind(int i, int64_t v) { sqlite3_bind_int64(stmt_, i, v); return *this; }
-  CSQLiteStatement& Bind(int i, double v) { sqlite3_bind_double(stmt_, i, v); return *this; }
+  CSQLiteStatement& Bind(int i, int64_t v) {
+    sqlite3_bind_int64(stmt_, i, v);
+    return *this;
+  }
+  CSQLiteStatement& Bind(int i, double v) {
+    sqlite3_bind_double(stmt_, i, v);
+    return *this;
+  }
   CSQLiteStatement& Bind(int i, std::string_view v) {
     sqlite3_bind_text(stmt_, i, v.data(), static_cast<int>(v.size()), SQLITE_TRANSIENT);
     return *this;
@@ -35,7 +41,10 @@ class CSQLiteStatement {
     sqlite3_bind_blob(stmt_, i, data ? data : "", static_cast<int>(size), SQLITE_STATIC);
     return *this;
   }
-  CSQLiteStatement& BindNull(int i) { sqlite3_bind_null(stmt_, i); return *this; }
+  CSQLiteStatement& BindNull(int i) {
+    sqlite3_bind_null(stmt_, i);
+    return *this;
+  }
 
   // SQLITE_ROW, SQLITE_DONE or an error code.
   int Step() { return sqlite3_step(stmt_); }

@@ -362,7 +362,8 @@ int CVXXMPDB::FTIQuery(const std::string& tag, const std::string& text, int flag
   if (mode == fqExact ? text.empty() : FTIText::IsBlank(text)) {
     rc = Oids_(ForTag(kTagOids, tag), bindTag, found);
   } else if (mode == fqExact) {
-    rc = MatchExact_(tag, text, limited ? 0 : a, limited ? 0 : b, found);
+    std::string literal = FTIText::Unquote(text).value_or(text);
+    rc = MatchExact_(tag, literal, limited ? 0 : a, limited ? 0 : b, found);
   } else {
     rc = MatchWords_(tag, mode == fqPrefix ? FTIText::PrefixQuery(text) : text, found);
   }

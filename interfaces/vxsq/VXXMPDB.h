@@ -105,7 +105,8 @@ class CVXXMPDB : public CVXSQLite {
 
   // Query modes of FTIQuery (the low bits of `flag`).
   enum EFTIQuery : int {
-    fqExact = 0,   // the value, cut to (a, b) as in FTIGroupTags, equals text byte-wise
+    fqExact = 0,   // the value, cut to (a, b) as in FTIGroupTags, equals text byte-wise; text
+                   // in double quotes (inner ones doubled) is that literal, as categories pass it
     fqPrefix = 1,  // every blank-separated word of text begins a word of one value
     fqFTS = 2,     // text is an FTS5 query over the values; a syntax error fails, code 1
     fqLimit = 16,  // bit: a is the most OIDs returned (the lowest ones); a <= 0 means all

@@ -117,6 +117,12 @@ TEST_F(FTITest, ExactQueryComparesTheCutValue) {
   EXPECT_EQ(Query("xmp:CreateDate", "07", 0, 5, 2), (Oids{2}));
   EXPECT_EQ(Query("xmp:CreateDate", "07-14", 0, 5, 0), (Oids{2}));
   EXPECT_EQ(Query("xmp:CreateDate", "0", 0, 5, 1), (Oids{1, 2, 3}));
+  // A quoted text is the literal inside, quotes doubled; a broken quoting is compared as is.
+  EXPECT_EQ(Query("dc:subject", "\"Beach\"", 0), (Oids{1}));
+  Put(10, {{"q", "say \"hi\""}, {"q", "\"x\"\""}});
+  EXPECT_EQ(Query("q", "\"say \"\"hi\"\"\"", 0), (Oids{10}));
+  EXPECT_EQ(Query("q", "\"x\"\"", 0), (Oids{10}));
+  EXPECT_TRUE(Query("q", "\"say \"hi\"\"", 0).empty());
   EXPECT_EQ(Query("dc:creator", "ül", 0, 1, 2), (Oids{1}));
   EXPECT_EQ(Query("dc:creator", "ÜL", 0, 1, 2), (Oids{2}));
   EXPECT_EQ(Query("", "2021", 0, 0, 4), (Oids{1, 2, 4}));
