@@ -4,6 +4,10 @@ set -euo pipefail
 packages=(
   ca-certificates cmake ninja-build g++ clang libclang-rt-14-dev pkg-config
   libsqlite3-dev libre2-dev libicu-dev libgtest-dev libgmock-dev libbenchmark-dev
+  # the vx host: decoding and thumbnails, metadata, command line, CRC-32
+  libvips-dev libexiv2-dev libcli11-dev zlib1g-dev
+  # its demo collection: real photographs shipped by Debian
+  mate-backgrounds
 )
 missing=()
 for p in "${packages[@]}"; do
