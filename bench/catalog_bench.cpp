@@ -19,6 +19,7 @@
 #include "VXMemFile.h"
 #include "VXResult.h"
 #include "VXURI.h"
+#include "bench_db.h"
 #include "vxcatalog.h"
 
 namespace {
@@ -27,25 +28,10 @@ constexpr uint32_t kFiles = 1000000;
 constexpr uint32_t kFolders = 10000;
 constexpr uint32_t kGroups = 1000;
 
-std::string Scratch(const char* name) {
-  static const std::string dir = [] {
-    char tmpl[] = "/tmp/catalog_bench_XXXXXX";
-    return std::string(mkdtemp(tmpl));
-  }();
-  return dir + "/" + name;
-}
+using vxbench::Scratch;
 
-template <typename T>
-void Put(CQRLBlobDB& db, uint16_t type, uint32_t oid, const T& object) {
-  CVXMemFile file;
-  file << object;
-  db.Set(CQRLBlobDB::SSelector(type, oid), file.GetBuffer(),
-         static_cast<unsigned>(file.GetFileSize()));
-}
-
-// Writes the large catalog straight into its store, in one transaction: files round-robin over
-// the folders; categories 1 to 3 hold every 7th file from their own offset, the others ten
-// files each.
+// Writes the large catalog straight into its store: files round-robin over the folders;
+// categories 1 to 3 hold every 7th file from their own offset, the others ten files each.
 const std::string& LargeCatalog() {
   static const std::string path = [] {
     std::string p = Scratch("large.vxc");
@@ -54,34 +40,19 @@ const std::string& LargeCatalog() {
       engine.Catalog().Create(p);
       engine.Catalog().Close();
     }
-    CQRLBlobDB db;
-    db.Open(p, false);
-    sqlite3_exec(db.Handle(), "BEGIN", nullptr, nullptr, nullptr);
-    std::vector<CVXFolder> folders;
-    for (uint32_t f = 1; f <= kFolders; ++f) {
-      folders.emplace_back(CVXURI("/photos/f" + std::to_string(f) + "/", true), f, 0);
-    }
-    for (uint32_t oid = 1; oid <= kFiles; ++oid) {
-      uint32_t folder = (oid - 1) % kFolders + 1;
-      CVXCatFile file(oid, "IMG_" + std::to_string(oid) + ".JPG", folder);
-      file.Properties().Width = 4000;
-      file.Properties().Height = 3000;
-      Put(db, CVXCatalog::rtFile, oid, file);
-      folders[folder - 1].Files().push_back(oid);
-    }
-    for (const CVXFolder& f : folders) Put(db, CVXCatalog::rtFolder, f.Oid(), f);
-    for (uint32_t g = 1; g <= kGroups; ++g) {
-      CVXGroup group(g);
-      group.Name() = "Category " + std::to_string(g);
-      if (g <= 3) {
-        for (uint32_t oid = g; oid <= kFiles; oid += 7) group.Images().SetBulk(oid);
-      } else {
-        for (uint32_t oid = g * 10; oid < g * 10 + 10; ++oid) group.Images().Set(oid);
+    vxbench::WriteCatalog(p, kFiles, kFolders);
+    vxbench::InTransaction(p, [](CQRLBlobDB& db) {
+      for (uint32_t g = 1; g <= kGroups; ++g) {
+        CVXGroup group(g);
+        group.Name() = "Category " + std::to_string(g);
+        if (g <= 3) {
+          for (uint32_t oid = g; oid <= kFiles; oid += 7) group.Images().SetBulk(oid);
+        } else {
+          for (uint32_t oid = g * 10; oid < g * 10 + 10; ++oid) group.Images().Set(oid);
+        }
+        vxbench::Put(db, CVXCatalog::rtGroup, g, group);
       }
-      Put(db, CVXCatalog::rtGroup, g, group);
-    }
-    sqlite3_exec(db.Handle(), "COMMIT", nullptr, nullptr, nullptr);
-    db.Close();
+    });
     return p;
   }();
   return path;

@@ -417,6 +417,7 @@ unsigned CVXEngine::Close() {
     if ((rc = FreePlugIns()) != VX_OK) VX_ERROR(log_, rc, "Unloading plug-in modules");
     VX_LOG(log_, 3, "    Plug-in modules unloaded");
   }
+  thumbSizes_.clear();
   VX_LOG(log_, 2, "Done");
   return rc;
 }
@@ -482,4 +483,6 @@ void CVXEngine::ReleaseCaches() {
   matchDB_.ReleaseCaches();
   thumbDB_.ReleaseCaches();
   sortDB_.ReleaseCaches();
+  std::lock_guard<std::recursive_mutex> lock(lock_);
+  thumbSizes_.clear();
 }

@@ -1,1 +1,348 @@
 #include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "Shape.h"
+#include "VXGroup.h"
+#include "vxengine_fixture.h"
+
+namespace {
+
+using vxtest::MakeBitmap;
+using vxtest::MakeRow;
+using vxtest::MakeShape;
+using vxtest::MakeThumb;
+
+class EngineFilesTest : public vxtest::EngineFixture {
+ protected:
+  void SetUp() override {
+    EngineFixture::SetUp();
+    vxtest::DefineColumns(engine_, 2);
+    pics_ = AddFolder("c:/pics/");
+    other_ = AddFolder("c:/other/");
+  }
+
+  uint32_t AddGroup(const std::string& name, const std::vector<uint32_t>& files) {
+    CVXGroup group(engine_.Catalog().GenerateGroupOID());
+    group.Name() = name;
+    for (uint32_t f : files) group.Images().Set(f);
+    EXPECT_EQ(engine_.Catalog().AddGroup(group), VX_OK);
+    return group.Oid();
+  }
+
+  std::vector<uint32_t> Groups(uint32_t oid) {
+    std::vector<uint32_t> groups;
+    EXPECT_EQ(engine_.GetFileGroups(oid, groups), VX_OK);
+    return groups;
+  }
+
+  std::vector<CVXProperty> Properties(uint32_t oid) {
+    std::vector<CVXProperty> row;
+    engine_.GetImageProperties(oid, row);
+    return row;
+  }
+
+  // A file with data in every store: shape, thumbnail, properties, XMP and a category.
+  uint32_t AddFullFile(uint32_t folder, const std::string& name, uint32_t seed) {
+    uint32_t oid = AddFile(folder, name, seed);
+    EXPECT_EQ(engine_.AddImageProperties(oid, MakeRow(seed, 2)), VX_OK);
+    SetXMP(oid, name);
+    AddGroup("g" + name, {oid});
+    return oid;
+  }
+
+  // True when no store but the catalog holds anything of `oid`.
+  bool Gone(uint32_t oid) {
+    vxtest::StoreContents c = vxtest::ReadStores(engine_);
+    return engine_.Catalog().IsUniqueFileOID(oid) && !c.shapes.count(oid) && !c.thumbs.count(oid) &&
+           !c.properties.count(oid) && !c.xmp.count(oid);
+  }
+
+  uint32_t pics_ = 0;
+  uint32_t other_ = 0;
+};
+
+TEST_F(EngineFilesTest, AddFileComputesShapeDataAndUpdatesByNameIgnoringCase) {
+  CVXBitmap bitmap = MakeBitmap(30, 20, 5, true);
+  CVXCatFile file(0, "Img1.JPG", pics_);
+  file.Properties().Processed = 0;
+  log_.ClearCaptured();
+  ASSERT_EQ(engine_.AddFile(file, bitmap, 0xC0FFEE), VX_OK);
+  uint32_t oid = file.Oid();
+  EXPECT_NE(oid, 0u);
+  EXPECT_EQ(file.Properties().CRC, 0xC0FFEEu);
+  EXPECT_NE(file.Properties().Processed, 0);
+  EXPECT_TRUE(file.IsGreyscale());
+  for (const char* line : {"+ VXEngine::AddFile", "+ VXEngine::PF", "Insert", "- VXEngine::PF",
+                           "- VXEngine::AddFile"}) {
+    EXPECT_TRUE(log_.HasLine(line)) << line;
+  }
+
+  // Record 2/OID: a zero flag byte, then the shape calculation of the bitmap.
+  SVXDBRec_3 expected{};
+  CShape shape;
+  shape.CalcShapeInfo(bitmap, expected.Info, 127);
+  std::vector<uint8_t> stored = ShapeBytes(oid);
+  ASSERT_EQ(stored.size(), 1601u);
+  EXPECT_EQ(stored[0], 0);
+  EXPECT_EQ(std::memcmp(stored.data(), &expected, sizeof expected), 0);
+  EXPECT_EQ(File(oid).Properties().CRC, 0xC0FFEEu);
+
+  // The same name in other case updates that file under its OID, in colour now.
+  CVXCatFile again(0, "img1.jpg", pics_);
+  again.Properties().Flags = cfGreyscale;
+  log_.ClearCaptured();
+  ASSERT_EQ(engine_.AddFile(again, MakeBitmap(30, 20, 6), 7), VX_OK);
+  EXPECT_EQ(again.Oid(), oid);
+  EXPECT_TRUE(log_.HasLine("Update"));
+  EXPECT_FALSE(again.IsGreyscale());
+  EXPECT_NE(ShapeBytes(oid), stored);
+  EXPECT_EQ(File(oid).Properties().CRC, 7u);
+  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
+}
+
+TEST_F(EngineFilesTest, AddFileIntoAnUnknownFolderLeavesNothingBehind) {
+  CVXCatFile file(0, "a.jpg", 999);
+  EXPECT_EQ(engine_.AddFile(file, MakeBitmap(8, 8, 1), 0), VX_NOT_FOUND);
+  EXPECT_NE(file.Oid(), 0u) << "a new OID was taken";
+  EXPECT_TRUE(Gone(file.Oid()));
+
+  CVXCatFile ready(0, "b.jpg", 999);
+  CVXThumb thumb = MakeThumb(8, 8, 8, 1);
+  log_.ClearCaptured();
+  EXPECT_EQ(engine_.AddFile(ready, thumb, MakeShape(1)), VX_INDEX_CORRUPTED);
+  EXPECT_TRUE(log_.Has("Index corrupted. Run Diagnosis & Repair!"));
+  EXPECT_TRUE(Gone(ready.Oid()));
+  EXPECT_GT(ready.Oid(), file.Oid());
+}
+
+TEST_F(EngineFilesTest, AddFileFromThumbAndShapeAddsAndUpdates) {
+  CVXCatFile file(0, "x.png", pics_);
+  file.Properties().Processed = 0;
+  CVXThumb thumb = MakeThumb(64, 48, 300, 2);
+  ASSERT_EQ(engine_.AddFile(file, thumb, MakeShape(9)), VX_OK);
+  uint32_t oid = file.Oid();
+  EXPECT_EQ(thumb.Oid(), oid);
+  EXPECT_NE(File(oid).Properties().Processed, 0) << "the stored record carries the time";
+  SVXDBRec_3 shape = MakeShape(9);
+  EXPECT_EQ(ShapeBytes(oid), std::vector<uint8_t>(reinterpret_cast<uint8_t*>(&shape),
+                                                  reinterpret_cast<uint8_t*>(&shape) + 1601));
+  CVXCatFile same(0, "X.PNG", pics_);
+  CVXThumb wide = MakeThumb(640, 48, 30, 3);
+  ASSERT_EQ(engine_.AddFile(same, wide, MakeShape(10)), VX_OK);
+  EXPECT_EQ(same.Oid(), oid);
+  CVXThumb back;
+  ASSERT_EQ(engine_.GetThumb(oid, back), VX_OK);
+  EXPECT_EQ(back.Width(), 640u);
+  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
+}
+
+TEST_F(EngineFilesTest, MutationsNeedAnOpenWritableEngine) {
+  uint32_t oid = AddFile(pics_, "a.jpg");
+  Reopen(true);
+  CVXCatFile file(0, "b.jpg", pics_);
+  CVXFolder folder(CVXURI("c:/new/", true), 0, 0);
+  unsigned long newOid = 1;
+  log_.ClearCaptured();
+  EXPECT_EQ(engine_.AddFile(file, MakeBitmap(4, 4, 1), 0), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.RemoveFile(oid), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.MoveFile(oid, other_, "", false), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.CopyFile(oid, other_, newOid, "", false), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.SetFile(file), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.RenameFile(oid, "c.jpg"), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.AddFolder(folder), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.RemoveFolder(pics_), VX_NOT_MUTABLE);
+  CVXThumb thumb = MakeThumb(10, 10, 10, 1);
+  EXPECT_EQ(engine_.AddThumb(oid, thumb), VX_NOT_MUTABLE);
+  EXPECT_EQ(engine_.AddImageProperties(oid, MakeRow(1, 1)), VX_NOT_MUTABLE);
+  EXPECT_EQ(log_.Count("Engine not mutable"), 10u);
+  EXPECT_EQ(engine_.RemoveThumb(oid), VX_NOT_MUTABLE);
+  EXPECT_EQ(log_.Count("Engine not mutable"), 10u) << "RemoveThumb refuses without the line";
+  EXPECT_TRUE(HasThumb(oid));
+  EXPECT_EQ(File(oid).Name(), "a.jpg");
+  ASSERT_EQ(engine_.Close(), VX_OK);
+  EXPECT_EQ(engine_.AddFile(file, MakeBitmap(4, 4, 1), 0), VX_NOT_MUTABLE);
+}
+
+TEST_F(EngineFilesTest, RemoveFileClearsEveryStoreAndToleratesMissingData) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  uint32_t b = AddFullFile(pics_, "b.jpg", 2);
+  ASSERT_EQ(engine_.RemoveFile(a), VX_OK);
+  EXPECT_TRUE(Gone(a));
+  EXPECT_TRUE(Groups(a).empty());
+  EXPECT_FALSE(Gone(b));
+
+  // A file without shape data or thumbnail still leaves the catalog.
+  CVXCatFile bare(engine_.Catalog().GenerateFileOID(), "bare.jpg", pics_);
+  ASSERT_EQ(engine_.Catalog().AddFile(pics_, bare), VX_OK);
+  EXPECT_EQ(engine_.RemoveFile(bare.Oid()), VX_OK);
+  EXPECT_TRUE(engine_.Catalog().IsUniqueFileOID(bare.Oid()));
+  EXPECT_EQ(engine_.RemoveFile(12345), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("VXEngine::RemoveFile"));
+}
+
+TEST_F(EngineFilesTest, RemoveFolderTakesSubFoldersAndTheirFilesFromEveryStore) {
+  uint32_t sub = AddFolder("c:/pics/sub/");
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  uint32_t b = AddFullFile(sub, "b.jpg", 2);
+  uint32_t keep = AddFullFile(other_, "c.jpg", 3);
+  // A file that never got a thumbnail does not hold the folder back.
+  CVXCatFile noThumb(0, "n.jpg", sub);
+  ASSERT_EQ(engine_.AddFile(noThumb, MakeBitmap(4, 4, 1), 0), VX_OK);
+
+  ASSERT_EQ(engine_.RemoveFolder(pics_), VX_OK);
+  for (uint32_t oid : {a, b, noThumb.Oid()}) EXPECT_TRUE(Gone(oid)) << oid;
+  CVXFolder folder;
+  EXPECT_EQ(engine_.GetFolder(sub, folder), VX_NOT_FOUND);
+  EXPECT_FALSE(Gone(keep));
+  EXPECT_EQ(engine_.RemoveFolder(pics_), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Removing folder dependends"));
+}
+
+TEST_F(EngineFilesTest, MoveFileKeepsTheOidAndReplacesATarget) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  uint32_t b = AddFullFile(other_, "b.jpg", 2);
+  std::vector<uint8_t> shapeA = ShapeBytes(a);
+  std::vector<uint32_t> groupsA = Groups(a);
+
+  // Onto b's name without taking over: a keeps its own data, b is gone from every store.
+  ASSERT_EQ(engine_.MoveFile(a, other_, "B.JPG", false), VX_OK);
+  EXPECT_EQ(File(a).Properties().Folder, other_);
+  EXPECT_EQ(File(a).Name(), "B.JPG");
+  EXPECT_TRUE(Gone(b));
+  EXPECT_EQ(ShapeBytes(a), shapeA);
+  EXPECT_EQ(Properties(a), MakeRow(1, 2));
+  EXPECT_EQ(XMPPacket(a), "a.jpg");
+  EXPECT_EQ(Groups(a), groupsA);
+
+  // Taking over: the moved file gets the target's properties and categories.
+  uint32_t c = AddFullFile(pics_, "c.jpg", 3);
+  std::vector<uint32_t> groupsC = Groups(c);
+  ASSERT_EQ(engine_.MoveFile(a, pics_, "c.jpg", true), VX_OK);
+  EXPECT_TRUE(Gone(c));
+  EXPECT_EQ(Properties(a), MakeRow(3, 2));
+  EXPECT_EQ(Groups(a), groupsC);
+  EXPECT_EQ(ShapeBytes(a), shapeA);
+
+  // Within its own folder under its own name nothing is lost.
+  ASSERT_EQ(engine_.MoveFile(a, pics_, "", true), VX_OK);
+  EXPECT_EQ(ShapeBytes(a), shapeA);
+  EXPECT_TRUE(HasThumb(a));
+  EXPECT_EQ(Properties(a), MakeRow(3, 2));
+  EXPECT_EQ(engine_.MoveFile(999, pics_, "", false), VX_NOT_FOUND);
+}
+
+TEST_F(EngineFilesTest, CopyFileCopiesEveryStoreOrTakesOverTheTarget) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  unsigned long copy = 0;
+  ASSERT_EQ(engine_.CopyFile(a, other_, copy, "copy.jpg", false), VX_OK);
+  ASSERT_NE(copy, 0u);
+  uint32_t c = static_cast<uint32_t>(copy);
+  EXPECT_EQ(File(c).Name(), "copy.jpg");
+  EXPECT_EQ(ShapeBytes(c), ShapeBytes(a));
+  CVXThumb ta, tc;
+  ASSERT_EQ(engine_.GetThumb(a, ta), VX_OK);
+  ASSERT_EQ(engine_.GetThumb(c, tc), VX_OK);
+  EXPECT_EQ(tc.DataSize(), ta.DataSize());
+  EXPECT_EQ(std::memcmp(tc.Data(), ta.Data(), ta.DataSize()), 0);
+  EXPECT_EQ(Properties(c), MakeRow(1, 2));
+  EXPECT_EQ(XMPPacket(c), "a.jpg");
+  EXPECT_EQ(Groups(c), Groups(a));
+  EXPECT_FALSE(Gone(a));
+
+  // Onto an existing name, taking over: the copy gets the target's properties and categories,
+  // the source's shape and thumbnail, and the target leaves every store.
+  uint32_t t = AddFullFile(other_, "t.jpg", 5);
+  std::vector<uint32_t> groupsT = Groups(t);
+  unsigned long over = 0;
+  ASSERT_EQ(engine_.CopyFile(a, other_, over, "T.jpg", true), VX_OK);
+  uint32_t o = static_cast<uint32_t>(over);
+  EXPECT_TRUE(Gone(t));
+  EXPECT_EQ(Properties(o), MakeRow(5, 2));
+  EXPECT_EQ(Groups(o), groupsT);
+  EXPECT_EQ(ShapeBytes(o), ShapeBytes(a));
+  EXPECT_EQ(XMPPacket(o), "a.jpg");
+
+  // Onto itself: the copy replaces the source, and the source's data goes with it.
+  unsigned long self = 0;
+  ASSERT_EQ(engine_.CopyFile(a, pics_, self, "", false), VX_OK);
+  EXPECT_TRUE(Gone(a));
+  EXPECT_EQ(Properties(static_cast<uint32_t>(self)), MakeRow(1, 2));
+  EXPECT_TRUE(HasThumb(static_cast<uint32_t>(self)));
+}
+
+TEST_F(EngineFilesTest, FailedCopyLeavesNoHalfCopy) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  unsigned long copy = 77;
+  EXPECT_EQ(engine_.CopyFile(a, 999, copy, "x.jpg", false), VX_NOT_FOUND);
+  EXPECT_EQ(copy, 0u);
+  EXPECT_EQ(engine_.CopyFile(999, other_, copy, "x.jpg", false), VX_NOT_FOUND);
+
+  // A stale property row under the next OID makes the property copy fail.
+  uint32_t next = engine_.Catalog().Header().LastFileOid + 1;
+  unsigned long key = next;
+  ASSERT_EQ(
+      engine_.GetPropertyDatabase().AddRecord(VX_IMAGE_PROPERTIES_TABLE, key, MakeRow(0, 1), true),
+      VX_OK);
+  EXPECT_EQ(engine_.CopyFile(a, other_, copy, "x.jpg", false), VX_ALREADY_PRESENT);
+  EXPECT_EQ(copy, 0u);
+  EXPECT_TRUE(Gone(next));
+  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
+  EXPECT_FALSE(Gone(a));
+}
+
+TEST_F(EngineFilesTest, SetFileUpdatesTheRecordAndWithABitmapTheShape) {
+  uint32_t oid = AddFile(pics_, "a.jpg", 1);
+  std::vector<uint8_t> shape = ShapeBytes(oid);
+  CVXCatFile file = File(oid);
+  file.Properties().Size = 1234;
+  ASSERT_EQ(engine_.SetFile(file), VX_OK);
+  EXPECT_EQ(File(oid).Properties().Size, 1234u);
+  EXPECT_EQ(ShapeBytes(oid), shape);
+
+  CVXBitmap bitmap = MakeBitmap(16, 16, 9);
+  ASSERT_EQ(engine_.SetFile(file, &bitmap, 55), VX_OK);
+  EXPECT_NE(ShapeBytes(oid), shape);
+  EXPECT_EQ(File(oid).Properties().CRC, 55u);
+  ASSERT_EQ(engine_.SetFile(file, nullptr, 66), VX_OK);
+  EXPECT_EQ(File(oid).Properties().CRC, 55u) << "without a bitmap the record goes as given";
+
+  CVXCatFile unknown(4242, "u.jpg", pics_);
+  EXPECT_EQ(engine_.SetFile(unknown, &bitmap, 1), VX_NOT_FOUND);
+  EXPECT_TRUE(ShapeBytes(4242).empty());
+}
+
+TEST_F(EngineFilesTest, AddFolderMatchesMediumKindAndLocation) {
+  log_.ClearCaptured();
+  uint32_t again = AddFolder("C:/PICS/", "vol", "");
+  EXPECT_EQ(again, pics_) << "an empty serial matches any";
+  EXPECT_TRUE(log_.Has("Folder already in database. OID is " + std::to_string(pics_)));
+  EXPECT_TRUE(log_.Has("  file://C:/PICS/ Media-ID: vol, Serial "));
+  uint32_t otherMedium = AddFolder("c:/pics/", "VOL2", "1");
+  EXPECT_NE(otherMedium, pics_);
+  uint32_t otherSerial = AddFolder("c:/pics/", "VOL", "2");
+  EXPECT_NE(otherSerial, pics_);
+  EXPECT_TRUE(log_.Has("New Folder"));
+}
+
+TEST_F(EngineFilesTest, FolderRenamesMoveNoDataAndMissesAreLogged) {
+  uint32_t sub = AddFolder("c:/pics/sub/");
+  uint32_t b = AddFile(sub, "b.jpg");
+  ASSERT_EQ(engine_.RenameFolder(pics_, CVXURI("c:/moved/", true), "VOL", "1"), VX_OK);
+  CVXURI uri;
+  ASSERT_EQ(engine_.Catalog().GetFileURI(b, uri), VX_OK);
+  EXPECT_EQ(uri.AsString(), "file://c:/moved/sub/b.jpg");
+  EXPECT_EQ(ShapeBytes(b).size(), 1601u);
+  std::vector<uint32_t> list;
+  ASSERT_EQ(engine_.GetFolderFiles(pics_, list, true), VX_OK);
+  EXPECT_EQ(list, std::vector<uint32_t>{b});
+
+  log_.ClearCaptured();
+  CVXCatFile file;
+  EXPECT_EQ(engine_.GetFile(99, file), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Err 10020, OID searched: 99"));
+}
+
+}  // namespace

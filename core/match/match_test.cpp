@@ -1,1 +1,429 @@
 #include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <random>
+#include <vector>
+
+#include "MatchCSFuzzy.h"
+#include "MatchCSQuick.h"
+#include "MatchKernels.h"
+
+namespace {
+
+using Rec = SVXDBRec_3;
+
+// ---- Plain references, written from the description of each comparison. ----
+
+int Field(const Rec& r, int cell, int field) {
+  return reinterpret_cast<const uint8_t*>(&r)[1 + 4 * cell + field];
+}
+int D(const Rec& o, int oc, const Rec& c, int cc, int field) {
+  return std::abs(Field(o, oc, field) - Field(c, cc, field));
+}
+int Orientation(int r, int i, int k) {
+  switch (r) {
+    case 0:
+      return i + 20 * k;
+    case 1:
+      return i + 20 * (19 - k);
+    case 2:
+      return (19 - i) + 20 * k;
+    default:
+      return (19 - i) + 20 * (19 - k);
+  }
+}
+
+double RefDuplicates(const Rec& o, const Rec& c, const SVXMatchParams& p) {
+  double sum = 0;
+  for (int i = 0; i < 20; i += 4) {
+    for (int k = 0; k < 20; k += 4) {
+      int best = 1 << 30;
+      for (int r = 0; r < (p.Rotate ? 4 : 1); ++r) {
+        const int oc = Orientation(r, i, k), cc = i + 20 * k;
+        best = std::min(best, D(o, oc, c, cc, 0) + D(o, oc, c, cc, 1) + D(o, oc, c, cc, 2));
+      }
+      if (best <= 153) sum += 765 - best;
+    }
+  }
+  return sum * 5.22875816993464e-05 * 100;
+}
+
+double RefHistogram(const CHist& o, double weight, const CHist& c) {
+  double t = 0;
+  for (int i = 0; i < 256; ++i) t += std::min(o.Bins[i], c.Bins[i]);
+  const double r = std::trunc(t) / weight * 100;
+  return r > 100 ? 100 : r;
+}
+
+struct Ref {
+  const SVXMatchParams& p;
+  double a = p.LumaScale, b = p.ColorScale, dmax = (255 * a + 510) * b + 255;
+  int s = p.Fast ? 2 : 1;
+  bool weighted = p.Weighting != 0;
+
+  double Dist(const Rec& o, int oc, const Rec& c, int cc) const {
+    return (D(o, oc, c, cc, 0) * a + D(o, oc, c, cc, 1) + D(o, oc, c, cc, 2)) * b +
+           D(o, oc, c, cc, 3);
+  }
+  double Result(double n, double t) const { return std::max(n - t, 0.0) / n * 100; }
+
+  double Quick(const Rec& o, const Rec& c) const {
+    const double* W = p.Weights->W;
+    double n = (20 / s) * (20 / s) * dmax;
+    if (weighted) {
+      n = 0;
+      for (int i = 0; i < 20; i += s) {
+        for (int k = 0; k < 20; k += s) n += dmax * W[i + 20 * k];
+      }
+    }
+    double t[4] = {0, 0, 0, 0};
+    for (int i = 0; i < 20; i += s) {
+      for (int k = 0; k < 20; k += s) {
+        const int j = i + 20 * k;
+        if (weighted && !(W[j] > 1e-06)) continue;
+        for (int r = 0; r < (p.Rotate ? 4 : 1); ++r) {
+          t[r] += Dist(o, Orientation(r, i, k), c, j) * (weighted ? W[j] : 1.0);
+        }
+      }
+      if (!p.Rotate && weighted && p.Fast && i > 10) {
+        const double score = Result(n, t[0]);
+        if (score >= p.MinScore) return score;
+      }
+    }
+    if (p.Rotate) t[0] = std::min({t[0], t[1], t[2], t[3]});
+    return Result(n, t[0]);
+  }
+
+  double Fuzzy(const Rec& o, const Rec& c) const {
+    const double L = dmax * 0.06666666666666667, n = (20 / s) * (20 / s) * dmax;
+    double t = 0;
+    for (int i = 0; i < 20; i += s) {
+      for (int k = 0; k < 20; k += s) {
+        const double w = weighted ? p.Weights->W[i + 20 * k] : 1.0;
+        if (!(w > 1e-06)) continue;
+        t += p.Rotate ? FuzzyRotatedCell(o, c, i, k, w, L) : FuzzyCell(o, c, i, k, w, L);
+      }
+    }
+    return Result(n, t);
+  }
+
+  double FuzzyCell(const Rec& o, const Rec& c, int i, int k, double w, double L) const {
+    const int j = i + 20 * k;
+    const double d1 = D(o, j, c, j, 0) * a, d2 = D(o, j, c, j, 1), d3 = D(o, j, c, j, 2);
+    if (d1 * w <= L && d2 * w <= L && d3 * w <= L) return (d1 + d2 + d3) * w * b + D(o, j, c, j, 3);
+    for (int x = std::max(i - 2, 0); x <= std::min(i + 2, 20); x += s) {
+      for (int y = std::max(k - 2, 0); y <= std::min(k + 2, 20); y += s) {
+        const int m = x + 20 * y;
+        if (m > 399) continue;  // behind the record: never a match
+        if (D(o, j, c, m, 0) * a * w <= L && D(o, j, c, m, 1) * w <= L &&
+            D(o, j, c, m, 2) * w <= L) {
+          return ((D(o, j, c, m, 0) * a + D(o, j, c, m, 1) + D(o, j, c, m, 2)) * w * b +
+                  D(o, j, c, m, 3)) *
+                 (std::abs(k - y) + std::abs(i - x) + 1);
+        }
+      }
+    }
+    return dmax;
+  }
+
+  double FuzzyRotatedCell(const Rec& o, const Rec& c, int i, int k, double w, double L) const {
+    auto mins = [&](int cc, double(&m)[4]) {
+      for (int f = 0; f < 4; ++f) {
+        m[f] = 1e300;
+        for (int r = 0; r < 4; ++r) {
+          m[f] = std::min(m[f], D(o, Orientation(r, i, k), c, cc, f) * (f < 3 ? a : 1.0) * w);
+        }
+      }
+      return m[0] <= L && m[1] <= L && m[2] <= L;
+    };
+    double m[4];
+    if (mins(i + 20 * k, m)) return (m[0] + m[1] + m[2]) * b + m[3];
+    for (int x = std::max(i - 2, 0); x <= std::min(i + 2, 20); ++x) {
+      for (int y = std::max(k - 2, 0); y <= std::min(k + 2, 20); ++y) {
+        if (x + 20 * y > 399) continue;
+        if (mins(x + 20 * y, m)) {
+          return (m[0] + m[1] + m[2]) * b + m[3] + (std::abs(k - y) + std::abs(i - x) + 1);
+        }
+      }
+    }
+    return dmax;
+  }
+};
+
+// ---- Records and settings. ----
+
+uint8_t* Bytes(Rec& r) { return reinterpret_cast<uint8_t*>(&r.Info); }
+const uint8_t* Bytes(const Rec& r) { return reinterpret_cast<const uint8_t*>(&r.Info); }
+
+Rec Uniform(std::mt19937& rng) {
+  Rec r{};
+  for (int i = 0; i < 1600; ++i) Bytes(r)[i] = rng() & 0xFF;
+  return r;
+}
+
+// `o` with each byte moved by up to `amp`, and its cells shifted by dx rows and dy columns.
+Rec Near(const Rec& o, std::mt19937& rng, int amp, int dx = 0, int dy = 0) {
+  Rec r{};
+  for (int i = 0; i < 20; ++i) {
+    for (int k = 0; k < 20; ++k) {
+      const int from = std::clamp(i + dx, 0, 19) + 20 * std::clamp(k + dy, 0, 19);
+      for (int f = 0; f < 4; ++f) {
+        const int v = Field(o, from, f) + int(rng() % (2 * amp + 1)) - amp;
+        Bytes(r)[4 * (i + 20 * k) + f] = uint8_t(std::clamp(v, 0, 255));
+      }
+    }
+  }
+  return r;
+}
+
+Rec Turned(const Rec& o) {
+  Rec r{};
+  for (int j = 0; j < 400; ++j) std::memcpy(Bytes(r) + 4 * j, Bytes(o) + 4 * (399 - j), 4);
+  return r;
+}
+
+// Weighting 0 to 3 with the matrices of the selection: 3 is a random mask with some zeros.
+SVXWeightMatrix Weights(uint32_t weighting, std::mt19937& rng) {
+  SVXWeightMatrix w;
+  if (weighting != 3) {
+    w.Reset(weighting);
+    return w;
+  }
+  uint8_t mask[400];
+  for (uint8_t& m : mask) m = rng() % 4 == 0 ? 0 : rng() % 256;
+  w.SetMask(mask);
+  return w;
+}
+
+void ExpectSame(double want, double got) {
+  if (std::isnan(want)) {
+    EXPECT_TRUE(std::isnan(got)) << got;
+  } else {
+    EXPECT_NEAR(want, got, 1e-9);
+  }
+}
+
+// Every setting of Fast, Rotate and Weighting, with random scales and cut-offs.
+template <typename F>
+void ForEverySetting(F&& f) {
+  std::mt19937 rng(7);
+  for (uint32_t weighting = 0; weighting < 4; ++weighting) {
+    for (int flags = 0; flags < 4; ++flags) {
+      const SVXWeightMatrix w = Weights(weighting, rng);
+      SVXMatchParams p;
+      p.SetWeights(rng() % 101, rng() % 101);
+      p.Fast = flags & 1;
+      p.Rotate = flags & 2;
+      p.Weighting = weighting;
+      p.Weights = &w;
+      p.MinScore = rng() % 101;
+      SCOPED_TRACE(testing::Message() << "weighting " << weighting << " flags " << flags);
+      f(p, rng);
+    }
+  }
+}
+
+// Pairs of records from far apart to nearly equal, some shifted so that neighbours match.
+template <typename F>
+void ForRecordPairs(std::mt19937& rng, F&& f) {
+  for (int round = 0; round < 6; ++round) {
+    const Rec o = Uniform(rng);
+    f(o, Uniform(rng));
+    f(o, Near(o, rng, 8));
+    f(o, Near(o, rng, 40));
+    f(o, Near(o, rng, 12, 1, -1));
+    f(o, Near(o, rng, 25, -2, 2));
+  }
+}
+
+// The portable kernels, and the AVX2 ones where the processor has them.
+std::vector<const vxmatch::SKernelSet*> Implementations(const vxmatch::SKernelSet& portable,
+                                                        const vxmatch::SKernelSet* avx2) {
+  std::vector<const vxmatch::SKernelSet*> all = {&portable};
+  if (avx2) all.push_back(avx2);
+  return all;
+}
+std::vector<const vxmatch::SKernelSet*> QuickImplementations() {
+  return Implementations(vxmatch::PortableQuickKernels(), vxmatch::Avx2QuickKernels());
+}
+std::vector<const vxmatch::SKernelSet*> FuzzyImplementations() {
+  return Implementations(vxmatch::PortableFuzzyKernels(), vxmatch::Avx2FuzzyKernels());
+}
+
+TEST(MatchKernels, AgreeWithReferenceForEverySetting) {
+  ForEverySetting([](const SVXMatchParams& p, std::mt19937& rng) {
+    const Ref ref{p};
+    ForRecordPairs(rng, [&](const Rec& o, const Rec& c) {
+      const double quick = ref.Quick(o, c);
+      ExpectSame(quick, MatchCSQuick(o, c, p));
+      for (const auto* k : QuickImplementations()) {
+        ExpectSame(quick, k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p));
+      }
+      const double fuzzy = ref.Fuzzy(o, c);
+      ExpectSame(fuzzy, MatchCSFuzzy(o, c, p));
+      for (const auto* k : FuzzyImplementations()) {
+        ExpectSame(fuzzy, k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p));
+      }
+      ExpectSame(RefDuplicates(o, c, p), MatchDuplicates(o, c, p));
+    });
+  });
+}
+
+TEST(MatchKernels, HistogramAgreesAndNeverExceeds100) {
+  std::mt19937 rng(3);
+  ForRecordPairs(rng, [&](const Rec& o, const Rec& c) {
+    for (uint32_t weighting = 0; weighting < 3; ++weighting) {
+      CHist ho, hc;
+      ho.Build(o.Info, weighting);
+      hc.Build(c.Info, weighting);
+      double sum = 0;
+      for (float bin : ho.Bins) sum += bin;
+      for (double weight : {std::trunc(sum), 50.0}) {  // a small weight must clip to 100
+        const double r = MatchHistogram(ho, weight, hc);
+        EXPECT_EQ(RefHistogram(ho, weight, hc), r);
+        EXPECT_LE(r, 100.0);
+      }
+      EXPECT_EQ(100.0, MatchHistogram(ho, std::trunc(sum), ho));
+    }
+  });
+}
+
+// The walks compare byte differences with counts made from the scales; at and around the exact
+// boundary d * scale * w == limit the counts must agree with the test in doubles.
+TEST(MatchKernels, FitCountAgreesWithTheDirectTest) {
+  std::mt19937 rng(9);
+  std::uniform_real_distribution<double> scale(0, 25), weight(1e-06, 300);
+  for (int round = 0; round < 20000; ++round) {
+    const double a = round % 7 == 0 ? 0.0 : scale(rng), w = round % 2 ? 1.0 : weight(rng);
+    const int d0 = rng() % 256;
+    const double limit = round % 3 ? d0 * a * w : std::ldexp(double(rng() % 100000), -4);
+    int want = 0;
+    while (want < 256 && want * a * w <= limit) ++want;
+    ASSERT_EQ(want, vxmatch::FitCount(a, w, limit)) << a << " " << w << " " << limit;
+  }
+}
+
+// One cell pair everywhere, worked by hand with a = 6, b = 1.25: Dmax = 2805,
+// D = (10 * 6 + 20 + 30) * 1.25 + 40 = 177.5, colour distance 60.
+TEST(MatchKernels, HandWorkedScores) {
+  Rec o{}, c{};
+  for (int j = 0; j < 400; ++j) {
+    const uint8_t cell[4] = {10, 20, 30, 40};
+    std::memcpy(Bytes(c) + 4 * j, cell, 4);
+  }
+  SVXMatchParams p;
+  EXPECT_DOUBLE_EQ((2805 - 177.5) / 2805 * 100, MatchCSQuick(o, c, p));
+  EXPECT_DOUBLE_EQ((2805 - 177.5) / 2805 * 100, MatchCSFuzzy(o, c, p));
+  EXPECT_DOUBLE_EQ(705.0 / 765 * 100, MatchDuplicates(o, c, p));
+  p.Rotate = true;  // the four fields meet their own minimum: a applies to C2 and C3 too
+  EXPECT_DOUBLE_EQ((2805 - ((10 + 20 + 30) * 6 * 1.25 + 40)) / 2805 * 100, MatchCSFuzzy(o, c, p));
+}
+
+TEST(MatchKernels, IdenticalRecordsScore100AndTurnedOnesNeedRotate) {
+  ForEverySetting([](SVXMatchParams p, std::mt19937& rng) {
+    if (p.Weighting == 3) return;  // a mask with zeros; identical records are covered below
+    const Rec o = Uniform(rng), turned = Turned(o);
+    EXPECT_EQ(100.0, MatchCSQuick(o, o, p));
+    EXPECT_EQ(100.0, MatchCSFuzzy(o, o, p));
+    EXPECT_DOUBLE_EQ(100.0, MatchDuplicates(o, o, p));  // the factor is rounded
+    if (p.Rotate) {
+      EXPECT_EQ(100.0, MatchCSQuick(o, turned, p));
+      EXPECT_EQ(100.0, MatchCSFuzzy(o, turned, p));
+      EXPECT_DOUBLE_EQ(100.0, MatchDuplicates(o, turned, p));
+    } else {
+      EXPECT_LT(MatchCSQuick(o, turned, p), 100.0);
+      EXPECT_LT(MatchCSFuzzy(o, turned, p), 100.0);
+      EXPECT_LT(MatchDuplicates(o, turned, p), 100.0);
+    }
+  });
+}
+
+TEST(MatchKernels, AllZeroMaskLeavesQuickWithoutNorm) {
+  SVXWeightMatrix w;
+  const uint8_t zeros[400] = {};
+  w.SetMask(zeros);
+  std::mt19937 rng(5);
+  const Rec o = Uniform(rng), c = Uniform(rng);
+  for (int flags = 0; flags < 4; ++flags) {
+    SVXMatchParams p;
+    p.Fast = flags & 1;
+    p.Rotate = flags & 2;
+    p.Weighting = 3;
+    p.Weights = &w;
+    for (const auto* k : QuickImplementations()) {
+      EXPECT_TRUE(std::isnan(k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p)));
+    }
+    EXPECT_TRUE(std::isnan(MatchCSQuick(o, c, p)));
+  }
+}
+
+// Rows 0 to 11 equal, rows 12 to 19 as far apart as can be. A Fast weighted walk visits 10
+// columns of the even rows; after row 12 it scores 90, over the whole grid 60. Scores only fall
+// as rows are added, so the walk stops at row 12 or not at all.
+TEST(MatchKernels, WeightedFastQuickStopsOnceTheTopRowsPass) {
+  Rec o{}, c{};
+  for (int k = 0; k < 20; ++k) {
+    for (int i = 12; i < 20; ++i) std::memset(Bytes(c) + 4 * (i + 20 * k), 255, 4);
+  }
+  SVXWeightMatrix w;  // all ones
+  SVXMatchParams p;
+  p.Weighting = 1;
+  p.Weights = &w;
+  p.Fast = true;
+  for (const auto* k : QuickImplementations()) {
+    auto run = [&](double minScore) {
+      p.MinScore = minScore;
+      return k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p);
+    };
+    EXPECT_DOUBLE_EQ(90.0, run(85));
+    EXPECT_DOUBLE_EQ(60.0, run(95));
+    p.Fast = false;  // no early stop
+    EXPECT_DOUBLE_EQ(60.0, run(0));
+    p.Fast = true;
+  }
+}
+
+// Every cell of c is far off but for cell 20, row 0 of column 1. Straight, it is the neighbour
+// (0, 1) of the cells with i <= 2 and k <= 3, and the neighbour (20, 0) of those with i >= 18 and
+// k <= 2: 12 + 6 - 1 cells match at price 0 (o is black throughout) and cell 20 matches itself.
+// The bytes behind c, which a neighbourhood reaching y = 20 would address, match o but are never
+// read as cells.
+TEST(MatchKernels, FuzzyNeighbourhoodWrapsAtRow20AndStopsAtTheRecordEnd) {
+  std::vector<Rec> bank(2);  // c and the next record of a prefetch bank
+  Rec& c = bank[0];
+  const Rec o{};
+  for (const auto* k : FuzzyImplementations()) {
+    std::memset(Bytes(c), 255, 1600);
+    std::memset(Bytes(c) + 4 * 20, 0, 4);
+    SVXMatchParams p;
+    auto run = [&] { return k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p); };
+    EXPECT_DOUBLE_EQ(18.0 / 400 * 100, run());
+
+    std::memset(Bytes(c) + 4 * 20, 255, 4);
+    EXPECT_EQ(0.0, run());
+    p.Rotate = true;
+    EXPECT_EQ(0.0, run());
+  }
+}
+
+// With weights the fit test is scaled but the norm is not: records 1 apart in C2 pass
+// unweighted and score 0 under a mask of 255 everywhere, every cell costing Dmax.
+TEST(MatchKernels, FuzzyWeightsAboveOneCanScoreZero) {
+  Rec o{}, c{};
+  for (int j = 0; j < 400; ++j) Bytes(c)[4 * j + 1] = 1;
+  SVXMatchParams p;
+  EXPECT_GT(MatchCSFuzzy(o, c, p), 99.9);
+  uint8_t mask[400];
+  std::memset(mask, 255, sizeof mask);
+  SVXWeightMatrix w;
+  w.SetMask(mask);
+  p.Weighting = 3;
+  p.Weights = &w;
+  EXPECT_EQ(0.0, MatchCSFuzzy(o, c, p));
+}
+
+}  // namespace

@@ -1,0 +1,93 @@
+#include "MatchCSQuick.h"
+
+namespace vxmatch {
+namespace {
+
+// Visited cells: rows i and columns k in steps of kStep from 0, rows outer.
+template <int kStep, typename F>
+void ForVisited(F&& f) {
+  for (int i = 0; i < 20; i += kStep) {
+    for (int k = 0; k < 20; k += kStep) f(i, k);
+  }
+}
+
+template <int kStep>
+double Plain(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
+  SFieldSums sums;
+  ForVisited<kStep>([&](int i, int k) {
+    const int j = i + 20 * k;
+    sums.Add(o + 4 * j, c + 4 * j);
+  });
+  return Score(PlainNorm(p), sums.Total(p));
+}
+
+template <int kStep>
+double Rotated(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
+  SFieldSums sums[4];
+  ForVisited<kStep>([&](int i, int k) {
+    const uint8_t* cell = c + 4 * (i + 20 * k);
+    for (int r = 0; r < 4; ++r) sums[r].Add(o + 4 * Oriented(r, i, k), cell);
+  });
+  double total = sums[0].Total(p);
+  for (int r = 1; r < 4; ++r) total = std::min(total, sums[r].Total(p));
+  return Score(PlainNorm(p), total);
+}
+
+// N of the weighted comparisons: Dmax times the weights of the visited cells, small ones too.
+template <int kStep>
+double WeightedNorm(const SVXMatchParams& p) {
+  double sum = 0;
+  ForVisited<kStep>([&](int i, int k) { sum += p.Weights->W[i + 20 * k]; });
+  return sum * p.MaxDistance();
+}
+
+// The walk is written out by rows so that a Fast walk can accept the candidate once the rows
+// up to one above 10 already score MinScore.
+template <int kStep>
+double Weighted(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
+  const double* w = p.Weights->W;
+  const double norm = WeightedNorm<kStep>(p);
+  double total = 0;
+  for (int i = 0; i < 20; i += kStep) {
+    for (int k = 0; k < 20; k += kStep) {
+      const int j = i + 20 * k;
+      if (w[j] > 1e-06) total += Distance(o + 4 * j, c + 4 * j, p) * w[j];
+    }
+    if (kStep == 2 && i > 10) {
+      const double score = Score(norm, total);
+      if (score >= p.MinScore) return score;
+    }
+  }
+  return Score(norm, total);
+}
+
+template <int kStep>
+double WeightedRotated(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
+  const double* w = p.Weights->W;
+  double totals[4] = {};
+  ForVisited<kStep>([&](int i, int k) {
+    const int j = i + 20 * k;
+    if (!(w[j] > 1e-06)) return;
+    for (int r = 0; r < 4; ++r)
+      totals[r] += Distance(o + 4 * Oriented(r, i, k), c + 4 * j, p) * w[j];
+  });
+  const double total = std::min(std::min(totals[0], totals[1]), std::min(totals[2], totals[3]));
+  return Score(WeightedNorm<kStep>(p), total);
+}
+
+}  // namespace
+
+const SKernelSet& PortableQuickKernels() {
+  static const SKernelSet kernels = {ByStep<Plain<1>, Plain<2>>, ByStep<Weighted<1>, Weighted<2>>,
+                                     ByStep<Rotated<1>, Rotated<2>>,
+                                     ByStep<WeightedRotated<1>, WeightedRotated<2>>};
+  return kernels;
+}
+
+}  // namespace vxmatch
+
+double MatchCSQuick(const SVXDBRec_3& o, const SVXDBRec_3& c, const SVXMatchParams& p) {
+  static const vxmatch::SKernelSet& kernels =
+      vxmatch::Avx2QuickKernels() ? *vxmatch::Avx2QuickKernels() : vxmatch::PortableQuickKernels();
+  return kernels.Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p);
+}
