@@ -215,3 +215,11 @@ bool CVXURI::operator<(const CVXURI& other) const {
 }
 
 bool CVXURI::operator<(const std::string& text) const { return CompareNames(text_, text) < 0; }
+
+CVXURI CVXURI::Restore(std::string text, bool isFolder, uint32_t type) {
+  CVXURI uri;
+  uri.text_ = std::move(text);
+  uri.isFolder_ = isFolder;
+  uri.type_ = static_cast<EType>(type);
+  return uri;
+}

@@ -26,6 +26,9 @@ class CVXURI : public CVXBase {
   ~CVXURI() override = default;
 
   void Set(const std::string& text, bool isFolder);
+  // A location as a record stored it: text, flag and type taken as they are, not normalised
+  // again, so that a read gives back exactly what was written.
+  static CVXURI Restore(std::string text, bool isFolder, uint32_t type);
 
   // The stored text, protocol included.
   const std::string& AsString() const { return text_; }

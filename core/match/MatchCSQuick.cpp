@@ -3,11 +3,13 @@
 namespace vxmatch {
 namespace {
 
-// Visited cells: rows i and columns k in steps of kStep from 0, rows outer.
+// Visited cells: rows i and columns k in steps of kStep from 0, in memory order. Where only
+// the early stop needs the walk's own order, rows outer, the order changes no more than the
+// rounding of the sums.
 template <int kStep, typename F>
 void ForVisited(F&& f) {
-  for (int i = 0; i < 20; i += kStep) {
-    for (int k = 0; k < 20; k += kStep) f(i, k);
+  for (int k = 0; k < 20; k += kStep) {
+    for (int i = 0; i < 20; i += kStep) f(i, k);
   }
 }
 

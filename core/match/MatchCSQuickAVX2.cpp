@@ -58,9 +58,6 @@ VX_AVX2 inline __m256i ReversedFastMask(int q) {
                : _mm256_setr_epi32(0, 0, 0, 0, 0, -1, 0, -1);
 }
 
-// Chunks of a run of five that hold a visited cell.
-constexpr int ChunksVisited(bool fast) { return fast ? 3 : 5; }
-
 // Adds the differences of the cells visited, by mask under Fast.
 template <bool kFast>
 VX_AVX2 inline void AddVisited(SLaneSums& s, __m256i diff, __m256i visited) {
@@ -76,10 +73,11 @@ template <bool kFast>
 VX_AVX2 double Plain(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
   SLaneSums sums = ZeroSums();
   if constexpr (kFast) {
+    const __m256i rows = FastMask(0), top = FastMask(2);
     for (int run = 0; run < 50; run += 5) {
-      for (int q = 0; q < ChunksVisited(true); ++q) {
-        Add(sums, _mm256_and_si256(ChunkDiff(o, c, run + q), FastMask(q)));
-      }
+      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run), rows));
+      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run + 1), rows));
+      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run + 2), top));
     }
   } else {
     const __m256i low = _mm256_set1_epi16(0xFF);
@@ -113,26 +111,36 @@ VX_AVX2 inline __m256i LoadFlipped(const uint8_t* o, int v) {
                                  1);
 }
 
-// With c's chunk v, in cells j = 8v to 8v + 7:
+// Adds the four orientations of c's chunk v, with c's cells j = 8v to 8v + 7:
 //   O1 is o's chunk v; O2 is o flipped in k (LoadFlipped);
 //   O4 at j is o[399 - j]: o's chunk 49 - v against c's chunk reversed;
 //   O3 at j is o flipped in k at 399 - j: the flipped chunk 49 - v against c's chunk reversed.
+// Under Fast `visited` masks the visited cells, and `reversed_visited` the same reversed.
+template <bool kFast>
+VX_AVX2 inline void AddRotated(SLaneSums (&sums)[4], const uint8_t* o, const uint8_t* c, int v,
+                               __m256i visited, __m256i reversed_visited) {
+  const __m256i cell = Load32(c + 32 * v);
+  const __m256i reversed =
+      _mm256_permutevar8x32_epi32(cell, _mm256_setr_epi32(7, 6, 5, 4, 3, 2, 1, 0));
+  AddVisited<kFast>(sums[0], AbsDiff(Load32(o + 32 * v), cell), visited);
+  AddVisited<kFast>(sums[1], AbsDiff(LoadFlipped(o, v), cell), visited);
+  AddVisited<kFast>(sums[2], AbsDiff(LoadFlipped(o, 49 - v), reversed), reversed_visited);
+  AddVisited<kFast>(sums[3], AbsDiff(Load32(o + 32 * (49 - v)), reversed), reversed_visited);
+}
+
 template <bool kFast>
 VX_AVX2 double Rotated(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
-  const __m256i reverse = _mm256_setr_epi32(7, 6, 5, 4, 3, 2, 1, 0);
   SLaneSums sums[4] = {ZeroSums(), ZeroSums(), ZeroSums(), ZeroSums()};
-  for (int run = 0; run < 50; run += 5) {
-    for (int q = 0; q < ChunksVisited(kFast); ++q) {
-      const int v = run + q;
-      const __m256i cell = Load32(c + 32 * v);
-      const __m256i reversed = _mm256_permutevar8x32_epi32(cell, reverse);
-      const __m256i visited = kFast ? FastMask(q) : __m256i{};
-      const __m256i reversedVisited = kFast ? ReversedFastMask(q) : __m256i{};
-      AddVisited<kFast>(sums[0], AbsDiff(Load32(o + 32 * v), cell), visited);
-      AddVisited<kFast>(sums[1], AbsDiff(LoadFlipped(o, v), cell), visited);
-      AddVisited<kFast>(sums[2], AbsDiff(LoadFlipped(o, 49 - v), reversed), reversedVisited);
-      AddVisited<kFast>(sums[3], AbsDiff(Load32(o + 32 * (49 - v)), reversed), reversedVisited);
+  if constexpr (kFast) {
+    const __m256i rows = FastMask(0), top = FastMask(2);
+    const __m256i reversed_rows = ReversedFastMask(0), reversed_top = ReversedFastMask(2);
+    for (int run = 0; run < 50; run += 5) {
+      AddRotated<true>(sums, o, c, run, rows, reversed_rows);
+      AddRotated<true>(sums, o, c, run + 1, rows, reversed_rows);
+      AddRotated<true>(sums, o, c, run + 2, top, reversed_top);
     }
+  } else {
+    for (int v = 0; v < 50; ++v) AddRotated<false>(sums, o, c, v, __m256i{}, __m256i{});
   }
   double total = Reduce(sums[0]).Total(p);
   for (int r = 1; r < 4; ++r) total = std::min(total, Reduce(sums[r]).Total(p));

@@ -33,8 +33,9 @@ double MatchDuplicates(const SVXDBRec_3& o, const SVXDBRec_3& c, const SVXMatchP
   return sum * 5.22875816993464e-05 * 100;  // 1 / (25 * 765)
 }
 
-// The bins of histograms built from records are at least 0.25 and far below 2^24, so every
-// partial sum of them is exact in double and the four running sums give the same t as one.
+// The bins of histograms built from records are floats of at least 0.5, so multiples of 2^-24,
+// and their sum stays far below 2^29: every partial sum is exact in double, and four running
+// sums give the same t as one.
 double MatchHistogram(const CHist& o, double weight, const CHist& c) {
   double sums[4] = {};
   for (int bin = 0; bin < 256; bin += 4) {

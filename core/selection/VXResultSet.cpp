@@ -15,8 +15,8 @@ constexpr uint64_t kHitBytes = sizeof(uint32_t) + sizeof(double);
 
 // Walks the entries in order. A matching entry is erased and the walk starts again at the
 // first entry; in any other entry the matching hits are erased, only the first one of them
-// with `allHits` false. The restart matters in that case: an entry in front of an erased one
-// is visited again and gives up one more hit.
+// with `allHits` false. The restart matters only in that case (an entry in front of an erased
+// one is visited again and gives up one more hit), so with all hits the walk just goes on.
 template <typename EntryTest, typename HitTest>
 bool RemoveReferences(std::vector<SVXResultSetEntry>& entries, EntryTest entryTest, HitTest hitTest,
                       bool allHits) {
@@ -25,7 +25,7 @@ bool RemoveReferences(std::vector<SVXResultSetEntry>& entries, EntryTest entryTe
     if (entryTest(entries[i])) {
       entries.erase(entries.begin() + static_cast<std::ptrdiff_t>(i));
       removed = true;
-      i = 0;
+      if (!allHits) i = 0;
       continue;
     }
     std::vector<SVXRSEntry>& hits = entries[i].Hits;
@@ -74,14 +74,13 @@ void WriteEntry(CVXFile& file, const SVXResultSetEntry& e) {
   for (const SVXRSEntry& h : e.Hits) file << h.OID << h.Score;
 }
 
-// The URI type is derived again from the text by Set; the stored one is not needed.
 SVXResultSetEntry ReadEntry(CVXFile& file) {
   SVXResultSetEntry e;
   uint32_t uriType = 0, hitCount = 0;
   uint8_t isFolder = 0;
   std::string text;
   file >> e.Number >> e.OID >> uriType >> isFolder >> text >> e.File >> hitCount;
-  e.URI.Set(text, isFolder != 0);
+  e.URI = CVXURI::Restore(std::move(text), isFolder != 0, uriType);
   if (hitCount * kHitBytes > file.Remaining()) VX_THROW(VX_NOT_FOUND);
   e.Hits.resize(hitCount);
   for (SVXRSEntry& h : e.Hits) file >> h.OID >> h.Score;

@@ -600,8 +600,7 @@ double CVXSelBase::LooseMatchFileName(const char* a, const char* b) const {
   return VXNameMatch::LooseMatchFileName(a, b);
 }
 
-bool CVXSelBase::PatternMatchFileName(const char* pattern, const char* name,
-                                      double& score) const {
+bool CVXSelBase::PatternMatchFileName(const char* pattern, const char* name, double& score) const {
   return VXNameMatch::PatternMatchFileName(pattern, name, score);
 }
 
@@ -640,8 +639,7 @@ bool CVXSelBase::CheckPropRec(double& score) {
   return n >= 1;
 }
 
-bool CVXSelBase::CheckProps(const SSelProps& selector, const CVXProperty& property,
-                            double& score) {
+bool CVXSelBase::CheckProps(const SSelProps& selector, const CVXProperty& property, double& score) {
   score = 100;
   switch (selector.DataType) {
     case vptString:
@@ -669,8 +667,7 @@ bool CVXSelBase::CheckProps(const SSelProps& selector, const CVXProperty& proper
 
 // Word mode: the condition's words are regular expressions tried on each word of the value;
 // "+word" must match, "-word" must not, and of the plain words one is enough.
-bool CVXSelBase::MatchPropString(const SSelProps& selector, const CVXProperty& property,
-                                 double&) {
+bool CVXSelBase::MatchPropString(const SSelProps& selector, const CVXProperty& property, double&) {
   const SSelProps::SCondition& first = selector.Conditions[0];
   const std::string s = _mbsupr(property.String());
   const std::string p = _mbsupr(first.Value.String());

@@ -74,6 +74,7 @@ unsigned CVXSelEngine::InitSelection(const CVXSelector& selector,
     originalShape_ = nullptr;
     originalShapes_.clear();
     shapeCache_.clear();
+    currentShape_ = nullptr;
     externalMatch_ = std::any_of(originals_.begin(), originals_.end(), [](const auto& d) {
       return d.OID == 0 && !d.URI.AsString().empty();
     });
@@ -118,6 +119,7 @@ unsigned CVXSelEngine::Run(CVXResultSet& result) {
   shapeBuffer_.reset();
   originalShapes_.clear();
   shapeCache_.clear();
+  currentShape_ = nullptr;
   Finish_(result);
   VX_LOG(engine_->LogFile(), 3, "Done");
   return result_;
@@ -134,6 +136,7 @@ void CVXSelEngine::ResetRun_(CVXResultSet& result) {
   originalShapes_.clear();
   originalHists_.clear();
   shapeCache_.clear();
+  currentShape_ = nullptr;
   candidates_.clear();
   shapeBuffer_.reset();
 }
@@ -452,6 +455,14 @@ void CVXSelEngine::Finish_(CVXResultSet& result) {
 // ---- Shape records and histograms
 
 const SVXDBRec_3* CVXSelEngine::GetCurrentShapeInfo() {
+  // Every original asks for the same candidate's record in turn.
+  if (currentShape_ && currentShapeOid_ == currentOid_) return currentShape_;
+  currentShape_ = FindCurrentShape_();
+  currentShapeOid_ = currentOid_;
+  return currentShape_;
+}
+
+const SVXDBRec_3* CVXSelEngine::FindCurrentShape_() {
   if (auto it = shapeCache_.find(currentOid_); it != shapeCache_.end()) return it->second;
   SPrefetchBlock& p = Prefetch();
   for (;;) {

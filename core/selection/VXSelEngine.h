@@ -111,6 +111,7 @@ class CVXSelEngine : public CVXBase {
   void PrepareResults_(CVXResultSet& result);
   void Finish_(CVXResultSet& result);
   bool ReportProgress_(unsigned percent, bool atLeastOneSecond);
+  const SVXDBRec_3* FindCurrentShape_();
   // Passes `go` through; false cancels the run and says so.
   bool Cancel_(bool go);
 
@@ -136,6 +137,9 @@ class CVXSelEngine : public CVXBase {
   std::vector<uint32_t> candidates_;
   size_t candidatePos_ = 0;
   std::map<uint32_t, const SVXDBRec_3*> shapeCache_;
+  // The record GetCurrentShapeInfo last gave, for that OID; null after a reset.
+  const SVXDBRec_3* currentShape_ = nullptr;
+  uint32_t currentShapeOid_ = 0;
   std::map<uint32_t, std::pair<CHist, double>> originalHists_;
   std::unique_ptr<uint8_t[]> shapeBuffer_;
   // Progress bookkeeping of the current stage.

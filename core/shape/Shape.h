@@ -8,6 +8,8 @@
 #include "VXColor.h"
 #include "VXMatchInfo.h"
 
+class CVexoraSettings;
+
 // Computes the shape and colour record of an image and holds the query of the comparisons: the
 // original's record and a colour query. One CShape per worker: the luminance scratch buffer is
 // kept across calls so that a run of images allocates only when an image is larger than any
@@ -32,6 +34,23 @@ class CShape : public CVXBase {
   void SetOriginal(const SVXMatchInfo& info);
   // Copies the 20 x 20 colour query (cell order x * 20 + y) and computes C1 to C3 of each cell.
   void SetColorInfo(const SColPercMatchInfo (*cells)[20]);
+
+  // Difference of `query` from Original, lower being closer, by settings.Method: 1
+  // MatchDuplicates, 2 MatchShapeColorQuick, 3 MatchShapeColor; any other method gives 0.
+  // The three return 10000.0 as soon as their running difference passes settings.MaxDifference.
+  double Compare(const SVXMatchInfo& query, const CVexoraSettings& settings) const;
+  // Difference of `query` from the colour query in ColorInfo under settings.ColorTolerance:
+  // method 6 counts the colour cells found in place, method 7 how much of each colour of the
+  // palette (the first row of ColorInfo) the query covers. Other methods give 100.0.
+  double CompareColor(const SVXMatchInfo& query, const CVexoraSettings& settings) const;
+
+  // Colour only, on a 5 x 5 sample of the cells.
+  double MatchDuplicates(const SVXMatchInfo& query, const CVexoraSettings& settings) const;
+  // Colour and shape, cell against cell.
+  double MatchShapeColorQuick(const SVXMatchInfo& query, const CVexoraSettings& settings) const;
+  // Colour and shape; a cell too far off may match a query cell up to two steps away, at a
+  // price growing with the distance.
+  double MatchShapeColor(const SVXMatchInfo& query, const CVexoraSettings& settings) const;
 
   // Fills C1 to C3 of `info` from r, g, b.
   static void RGB2C(unsigned char r, unsigned char g, unsigned char b, ShapeColorInfo& info);

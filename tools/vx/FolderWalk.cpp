@@ -42,6 +42,8 @@ bool FolderWalk::IsCandidate(std::string_view fileName) const {
 
 HostStatus FolderWalk::Walk(const std::vector<std::string>& roots, const Visitor& visit) {
   HostStatus result;
+  seen_.clear();
+  problems_.clear();
   for (const auto& root : roots) {
     std::error_code ec;
     fs::path canonical = fs::canonical(root, ec);

@@ -51,7 +51,8 @@ class FolderWalk {
   FolderWalk(std::vector<std::string> extensions, VolumeTable volumes);
 
   // Ok when every root could be read (stopping early included); else kIoError naming the
-  // first root that failed, the others having been walked all the same.
+  // first root that failed, the others having been walked all the same. Each call starts
+  // afresh: problems() then holds this walk's.
   HostStatus Walk(const std::vector<std::string>& roots, const Visitor& visit);
 
   bool IsCandidate(std::string_view fileName) const;

@@ -42,10 +42,12 @@ struct EncodedJpeg {
   uint32_t height = 0;
 };
 
-// Decodes image files with libvips, shrinking on load. Thread-safe: one decoder may serve any
-// number of threads at once. Never throws; every failure is a status with libvips' message.
-// An image above maxPixels is refused from its header, so a forged or huge header costs
-// nothing: most loaders (PNG among them) cannot shrink while decoding and would read all rows.
+// Decodes image files with libvips to at most maxSide pixels a side: JPEG, WebP and HEIF decode
+// at a reduced size (shrink on load); other formats stream their rows through the resize, so
+// memory stays bounded by the output. Thread-safe: one decoder may serve any number of threads
+// at once. Never throws; every failure is a status with libvips' message. An image above
+// maxPixels is refused from its header, so a forged or huge header costs nothing: a loader that
+// cannot shrink would otherwise read every row of it.
 class ImageDecoder {
  public:
   explicit ImageDecoder(const DecodeOptions& options = DecodeOptions());
