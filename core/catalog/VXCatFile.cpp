@@ -3,6 +3,7 @@
 #include <cstring>
 #include <ctime>
 #include <utility>
+#include <vector>
 
 #include "VXFile.h"
 #include "xstring.h"
@@ -41,6 +42,22 @@ struct ByteCursor {
     at += sizeof v;
   }
 };
+
+// A catalog load reads a million names; a short one goes straight into the string instead of
+// through the stream's temporary vector. A long one takes the stream's path, whose allocation
+// grows only with the bytes that are really there.
+void ReadName(CVXFile& file, std::string& name) {
+  constexpr uint32_t kShortName = 4096;
+  uint32_t length = 0;
+  file >> length;
+  if (length > kShortName || length > file.Remaining()) {
+    std::vector<uint8_t> bytes = file.ReadBytes(length);
+    name.assign(bytes.begin(), bytes.end());
+    return;
+  }
+  name.resize(length);
+  file.Read(name.data(), length);
+}
 
 }  // namespace
 
@@ -87,7 +104,7 @@ void CVXCatFile::Read(CVXFile& file) {
   uint8_t head[8], block[kBlockBytes];
   SData d;
   file.Read(head, sizeof head);
-  file >> d.Name;
+  ReadName(file, d.Name);
   file.Read(block, sizeof block);
   uint32_t oid = 0;
   std::memcpy(&oid, head + 2, sizeof oid);

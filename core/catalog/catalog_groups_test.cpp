@@ -95,19 +95,7 @@ TEST_F(CatalogGroups, FileAssignment) {
   ASSERT_EQ(Cat().SetFileGroups(7, {}, false), VX_OK);
   Cat().GetFileGroups(7, groups);
   EXPECT_TRUE(groups.empty());
-  // Exclusive assignment takes the file out of every other category first.
-  Cat().SetFileGroups(9, {a}, true);
-  CVXGroup exclusive = Group(b);
-  exclusive.Flags() |= gfExclusiveAll;
-  ASSERT_EQ(Cat().UpdateGroup(exclusive), VX_OK);
-  Cat().SetFileGroups(9, {b}, true);
-  Cat().GetFileGroups(9, groups);
-  EXPECT_EQ(groups, std::vector<uint32_t>{b});
 }
-
-}  // namespace
-
-namespace {
 
 TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
   uint32_t root = AddGroup("Models");
@@ -128,6 +116,12 @@ TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
   std::vector<uint32_t> roots;
   Cat().GetDynamicGroups(roots);
   EXPECT_EQ(roots, (std::vector<uint32_t>{root, other}));
+  // No root needs a build; forcing a child alone marks it and builds nothing.
+  EXPECT_EQ(Cat().UpdateDynamicGroups(0, false, false), VX_OK);
+  EXPECT_FALSE(Group(child).NeedsRecalc());
+  EXPECT_EQ(Cat().UpdateDynamicGroups(child, true, false), VX_OK);
+  EXPECT_TRUE(Group(child).NeedsRecalc());
+  EXPECT_FALSE(Group(root).NeedsRecalc());
   ASSERT_EQ(Cat().InvalidateDynamicGroups(0, "exif"), VX_OK);
   EXPECT_TRUE(Group(root).NeedsRecalc());
   EXPECT_TRUE(Group(child).NeedsRecalc());
@@ -141,10 +135,6 @@ TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
   EXPECT_EQ(Group(root).Children(), std::vector<uint32_t>{byHand});
   EXPECT_EQ(Cat().ClearDynamicGroup(12345), VX_NOT_FOUND);
 }
-
-}  // namespace
-
-namespace {
 
 TEST_F(CatalogGroups, FolderReferencesMoveToAnotherFolder) {
   uint32_t from = AddFolder("c:/old/");

@@ -55,14 +55,30 @@ TEST_F(CatalogOps, TreeLinksWhateverTheOrderAndSurvivesReopen) {
   ASSERT_EQ(Cat().GetFolderChildren(c, files, true), VX_OK);
   EXPECT_EQ(files, std::vector<uint32_t>{c});
 
-  std::vector<std::vector<uint8_t>> before;
-  for (const auto& [oid, f] : Cat().Files()) before.push_back(Bytes(f));
-  for (const auto& [oid, f] : Cat().Folders()) before.push_back(Bytes(f));
+  AddGroup("Other");
+  CVXGroup g = Group(AddGroup("Sub", AddGroup("Top", 0, {f1})));
+  ASSERT_EQ(g.SetExpression(Cat(), R"("RFolder@file://c:/a/b/<VOL.1234>" NOT "Other")").code,
+            VX_OK);
+  Store(g);
+
+  // Every record of the three maps comes back byte for byte, under the same keys; the first
+  // load only adds "@Interactive".
+  auto maps = [&](uint32_t skip) {
+    std::vector<std::pair<uint32_t, std::vector<uint8_t>>> all;
+    for (const auto& [oid, f] : Cat().Files()) all.emplace_back(oid, Bytes(f));
+    for (const auto& [oid, f] : Cat().Folders()) all.emplace_back(oid, Bytes(f));
+    for (const auto& [oid, f] : Cat().Groups()) {
+      if (oid != skip) all.emplace_back(oid, Bytes(f));
+    }
+    return all;
+  };
+  const auto built = maps(0);
+  EXPECT_EQ(built.size(), 2u + 4u + 4u);
   Reopen();
-  std::vector<std::vector<uint8_t>> after;
-  for (const auto& [oid, f] : Cat().Files()) after.push_back(Bytes(f));
-  for (const auto& [oid, f] : Cat().Folders()) after.push_back(Bytes(f));
-  EXPECT_EQ(before, after);
+  EXPECT_EQ(maps(Cat().GetInteractiveGroup()), built);
+  const auto loaded = maps(0);
+  Reopen();
+  EXPECT_EQ(maps(0), loaded);
 }
 
 TEST_F(CatalogOps, LookupsAndFileSets) {
@@ -151,12 +167,24 @@ TEST_F(CatalogOps, RemoveFoldersWithAndWithoutChildren) {
   ASSERT_EQ(Cat().RemoveFolder(a, true), VX_OK);
   EXPECT_EQ(Cat().NumberOfFolders(), 1u);
   EXPECT_EQ(Cat().NumberOfFiles(), 1u);
+  // A formula that names the removed folder is emptied whole, and stored so.
+  const uint32_t byC = AddGroup("ByC"), other = AddGroup("Other");
+  for (const auto& [oid, text] :
+       {std::pair<uint32_t, std::string>{byC, R"("@Unassigned" OR )"
+                                              R"("RFolder@file:///a/b/c/<VOL.1234>")"},
+        {other, R"("@Unassigned")"}}) {
+    CVXGroup g = Group(oid);
+    ASSERT_EQ(g.SetExpression(Cat(), text).code, VX_OK);
+    Store(g);
+  }
   ASSERT_EQ(Cat().RemoveFolder(c, true), VX_OK);
   CVXCatFile gone;
   EXPECT_EQ(Cat().LookupFile(f, gone), VX_NOT_FOUND);
   Reopen();
   EXPECT_EQ(Cat().NumberOfFolders(), 0u);
   EXPECT_EQ(Cat().NumberOfFiles(), 0u);
+  EXPECT_TRUE(Group(byC).Infix().empty() && Group(byC).Postfix().empty());
+  EXPECT_EQ(Group(other).Postfix().size(), 1u);
 }
 
 TEST_F(CatalogOps, RenameFolderMovesTreesAndMerges) {

@@ -149,6 +149,7 @@ void CVXCatalog::OpenContent_(bool headerDamaged) {
     VX_THROW(VX_NOT_FOUND);
   }
   if (headerDamaged) RestoreHeader_();
+  if (!store_.IsReadOnly()) CleanPersistantSelections_();
 }
 
 // Rebuilds a header whose two copies are lost from the loaded maps. The counters become the

@@ -155,6 +155,10 @@ class CVXCatalog : public CVXBase {
   unsigned InvalidateDynamicGroups(uint32_t oid, const char* tag);
   // Turns a data-driven root into an ordinary category and removes its data-driven children.
   unsigned ClearDynamicGroup(uint32_t oid);
+  // Rebuilds the data-driven roots that need it (all with `force`; `oid` 0 means every root);
+  // with `force` their children are marked for a new query as well. 10001 when no root needs
+  // a build; else the first failure of the builds.
+  unsigned UpdateDynamicGroups(uint32_t oid, bool force, bool recalcChildren);
   // Files of no top-level category; 15014 when a formula comes back here through "@Unassigned".
   unsigned GetUnassignedImages(CBitVector& bits);
   // OID of the stored persistent selection of that name; 10020 when there is none.
@@ -214,11 +218,14 @@ class CVXCatalog : public CVXBase {
 
  private:
   CQRLLogfile* Log_() const;
-  // The frame of every mutating operation: entry and exit lines, the body's exceptions turned
-  // into codes, a failure logged. Without `catchVX` a CVXException counts as a framework
-  // exception (10003), whatever its code.
+  // Which exceptions of its body a frame turns into codes: all of them (a CVXException gives
+  // its own code); all but as if a CVXException were a framework exception (10003, whatever
+  // its code); or none, so that they pass to the caller.
+  enum EHandlers { hAllLevels, hOuterLevels, hNoHandlers };
+  // The frame of every mutating operation: entry and exit lines, the object's name, the body's
+  // exceptions handled as `handlers` says, a failed result logged.
   template <typename Body>
-  unsigned Frame_(const char* name, int level, const std::string* objectName, bool catchVX,
+  unsigned Frame_(const char* name, int level, const std::string* objectName, EHandlers handlers,
                   Body&& body);
   template <typename T>
   unsigned StoreRecord_(ERecordType type, const std::map<uint32_t, T>& map, uint32_t oid);
@@ -228,6 +235,12 @@ class CVXCatalog : public CVXBase {
   // selector on that key) and returns the result of the walk.
   unsigned MarkPersistantSelectionsDirty_(const char* key = nullptr);
   void RemoveFileFromPersistantSelections_(uint32_t oid);
+  // Logs and answers 10020 where stored selections would have to be read.
+  unsigned SelectionsUnreadable_() const;
+  // Builds the children of one data-driven root from the full-text index.
+  unsigned BuildDynamicChildren_(uint32_t rootOid, bool force, bool recalcChildren);
+  // Drops empty and corrupt stored selections; run by each writable open.
+  void CleanPersistantSelections_();
   void RemapFolders_();
   static std::string ParentText_(const CVXURI& uri);
   CBitVector GroupScope_(uint32_t parentOid) const;
@@ -253,6 +266,8 @@ class CVXCatalog : public CVXBase {
   // the first failure.
   template <typename T>
   unsigned LoadEach_(ERecordType type, std::map<uint32_t, T>& loaded, bool sequential);
+  // Reads the records of oids[at, end) one behind the other out of `file` into the file map.
+  unsigned DecodeFiles_(CVXMemFile& file, const std::vector<uint32_t>& oids, size_t at, size_t end);
   uint32_t NextOid_(uint32_t SVXCatalogHeader::*field);
 
   CVXEngine* engine_ = nullptr;  // not owned

@@ -21,6 +21,23 @@ void SetWithMargin(CBitVector& bits, uint32_t oid, bool bulk) {
   }
 }
 
+// The files an XMP lookup names (it answers 0 on success); with `complement`, all the other
+// files of the catalog instead.
+template <typename Lookup>
+unsigned XMPFiles(CVXCatalog& catalog, bool complement, Lookup lookup, CBitVector& bits) {
+  std::vector<uint32_t> oids;
+  if (lookup(oids) != 0) return VX_FORMULA_OPERAND_FAILED;
+  if (complement) catalog.GetFiles(bits);
+  for (uint32_t oid : oids) {
+    if (complement) {
+      bits.Reset(oid);
+    } else {
+      bits.Set(oid);
+    }
+  }
+  return VX_OK;
+}
+
 }  // namespace
 
 CVXCatFile* CVXCatalog::GetFile(uint32_t oid) {
@@ -147,31 +164,25 @@ unsigned CVXCatalog::GetFilesForOrientation(bool portrait, CBitVector& bits) con
 unsigned CVXCatalog::GetRank(int32_t rank, CBitVector& bits) {
   bits.Clear();
   if (!engine_) return VX_FORMULA_OPERAND_FAILED;
-  std::vector<uint32_t> oids;
+  CVXXMPDB& xmp = engine_->XMPDB();
   if (rank != 0) {
-    if (engine_->XMPDB().GetOidsForRank(rank, oids) != 0) return VX_FORMULA_OPERAND_FAILED;
-    for (uint32_t oid : oids) bits.Set(oid);
-    return VX_OK;
+    return XMPFiles(
+        *this, false, [&](auto& oids) { return xmp.GetOidsForRank(rank, oids); }, bits);
   }
-  if (engine_->XMPDB().GetOidsWithRank(oids) != 0) return VX_FORMULA_OPERAND_FAILED;
-  GetFiles(bits);
-  for (uint32_t oid : oids) bits.Reset(oid);
-  return VX_OK;
+  return XMPFiles(
+      *this, true, [&](auto& oids) { return xmp.GetOidsWithRank(oids); }, bits);
 }
 
 unsigned CVXCatalog::GetLabel(const char* label, CBitVector& bits) {
   bits.Clear();
   if (!engine_) return VX_FORMULA_OPERAND_FAILED;
-  std::vector<uint32_t> oids;
+  CVXXMPDB& xmp = engine_->XMPDB();
   if (label && *label) {
-    if (engine_->XMPDB().GetOidsForLabel(label, oids) != 0) return VX_FORMULA_OPERAND_FAILED;
-    for (uint32_t oid : oids) bits.Set(oid);
-    return VX_OK;
+    return XMPFiles(
+        *this, false, [&](auto& oids) { return xmp.GetOidsForLabel(label, oids); }, bits);
   }
-  if (engine_->XMPDB().GetOidsWithLabel(oids) != 0) return VX_FORMULA_OPERAND_FAILED;
-  GetFiles(bits);
-  for (uint32_t oid : oids) bits.Reset(oid);
-  return VX_OK;
+  return XMPFiles(
+      *this, true, [&](auto& oids) { return xmp.GetOidsWithLabel(oids); }, bits);
 }
 
 // ---- Changing files
@@ -212,7 +223,7 @@ void CVXCatalog::InternalRemoveFile(uint32_t oid) {
 }
 
 unsigned CVXCatalog::AddFile(uint32_t folderOid, const CVXCatFile& file) {
-  return Frame_("AddFile", 3, &file.Name(), false, [&]() -> unsigned {
+  return Frame_("AddFile", 3, &file.Name(), hOuterLevels, [&]() -> unsigned {
     CVXFolder* folder = GetFolder(folderOid);
     if (!folder) return VX_NOT_FOUND;
     CVXCatFile copy = file;
@@ -230,7 +241,7 @@ unsigned CVXCatalog::AddFile(uint32_t folderOid, const CVXCatFile& file) {
 }
 
 unsigned CVXCatalog::UpdateFile(const CVXCatFile& file) {
-  return Frame_("UpdateFile", 3, &file.Name(), true, [&]() -> unsigned {
+  return Frame_("UpdateFile", 3, &file.Name(), hAllLevels, [&]() -> unsigned {
     CVXCatFile* record = GetFile(file.Oid());
     if (!record) return VX_NOT_FOUND;
     uint32_t oldCRC = record->Properties().CRC;
@@ -258,7 +269,7 @@ unsigned CVXCatalog::UpdateFile(const CVXCatFile& file) {
 }
 
 unsigned CVXCatalog::RemoveFile(uint32_t oid) {
-  return Frame_("RemoveFile", 3, nullptr, true, [&]() -> unsigned {
+  return Frame_("RemoveFile", 3, nullptr, hAllLevels, [&]() -> unsigned {
     CVXCatFile* record = GetFile(oid);
     if (!record) return VX_NOT_FOUND;
     uint32_t folderOid = record->Properties().Folder;
@@ -272,8 +283,7 @@ unsigned CVXCatalog::RemoveFile(uint32_t oid) {
     }
     for (auto& [goid, group] : groups_) {
       if (oid >= group.Images().Size() || !group.Images().Get(oid)) continue;
-      group.Images().Reset(oid);
-      group.SetImageListDirty(true);
+      group.RemoveImage(oid);
       if (unsigned rc = StoreGroup(goid); rc != VX_OK) {
         VX_ERROR(Log_(), rc, "RemoveFile: storing group");
         VX_WARN(Log_(), "Cannot update group after file remove!");
@@ -291,7 +301,7 @@ unsigned CVXCatalog::RemoveFile(uint32_t oid) {
 }
 
 unsigned CVXCatalog::RenameFile(uint32_t oid, const std::string& newName) {
-  return Frame_("RenameFile", 3, nullptr, true, [&]() -> unsigned {
+  return Frame_("RenameFile", 3, nullptr, hAllLevels, [&]() -> unsigned {
     CVXCatFile* record = GetFile(oid);
     if (!record) return VX_NOT_FOUND;
     unsigned rc = VX_OK;
@@ -312,7 +322,7 @@ unsigned CVXCatalog::RenameFile(uint32_t oid, const std::string& newName) {
 }
 
 unsigned CVXCatalog::MoveFile(uint32_t oid, uint32_t folderOid, const std::string& newName) {
-  return Frame_("MoveFile", 3, nullptr, true, [&]() -> unsigned {
+  return Frame_("MoveFile", 3, nullptr, hAllLevels, [&]() -> unsigned {
     CVXCatFile* record = GetFile(oid);
     if (!record) return VX_NOT_FOUND;
     uint32_t presentOid = record->Properties().Folder;
@@ -353,7 +363,7 @@ unsigned CVXCatalog::MoveFile(uint32_t oid, uint32_t folderOid, const std::strin
 
 unsigned CVXCatalog::CopyFile(uint32_t oid, uint32_t folderOid, unsigned long& newOid,
                               const std::string& newName) {
-  return Frame_("CopyFile", 3, nullptr, true, [&]() -> unsigned {
+  return Frame_("CopyFile", 3, nullptr, hAllLevels, [&]() -> unsigned {
     const CVXCatFile* source = GetFile(oid);
     if (!source) return VX_NOT_FOUND;
     unsigned rc = VX_NOT_FOUND;

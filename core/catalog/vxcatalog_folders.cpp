@@ -5,7 +5,6 @@
 #include <ctime>
 #include <unordered_map>
 
-#include "VXGroupParser.h"
 #include "VXURI.h"
 #include "vxcatalog_frame.h"
 #include "xstring.h"
@@ -245,7 +244,7 @@ std::string FolderTitle(const CVXFolder& f) {
 
 unsigned CVXCatalog::AddFolder(const CVXFolder& folder) {
   std::string title = FolderTitle(folder);
-  return Frame_("AddFolder", 3, &title, true, [&]() -> unsigned {
+  return Frame_("AddFolder", 3, &title, hAllLevels, [&]() -> unsigned {
     if (folders_.count(folder.Oid())) return VX_ALREADY_PRESENT;
     InternalAddFolder(folder.Oid(), folder);
     return VX_OK;
@@ -253,7 +252,7 @@ unsigned CVXCatalog::AddFolder(const CVXFolder& folder) {
 }
 
 unsigned CVXCatalog::UpdateFolder(const CVXFolder& folder) {
-  return Frame_("UpdateFolder", 3, &folder.URI().AsString(), true, [&]() -> unsigned {
+  return Frame_("UpdateFolder", 3, &folder.URI().AsString(), hAllLevels, [&]() -> unsigned {
     CVXFolder* record = GetFolder(folder.Oid());
     if (!record) return VX_NOT_FOUND;
     *record = folder;
@@ -272,7 +271,7 @@ unsigned CVXCatalog::UpdateFolder(const CVXFolder& folder) {
 unsigned CVXCatalog::RemoveFolder(uint32_t oid, bool recursive) {
   const CVXFolder* found = GetFolder(oid);
   std::string title = found ? FolderTitle(*found) : std::string();
-  return Frame_("RemoveFolder", 3, &title, true, [&]() -> unsigned {
+  return Frame_("RemoveFolder", 3, &title, hAllLevels, [&]() -> unsigned {
     CVXFolder* record = GetFolder(oid);
     if (!record) return VX_NOT_FOUND;
     const CVXFolder before = *record;
@@ -310,17 +309,16 @@ unsigned CVXCatalog::RemoveFolder(uint32_t oid, bool recursive) {
 }
 
 // A category whose formula names a removed folder loses its whole formula, not only that term.
+// Results are not looked at: the folder is gone whatever happens to the formulas.
 void CVXCatalog::ClearFolderReferences_(uint32_t folderOid) {
-  for (auto& [goid, group] : groups_) {
-    bool refers = false;
-    for (const SExpr& e : group.Postfix()) {
-      refers |= (e.Type == ttFolder || e.Type == ttRFolder) && e.Oid == folderOid;
-    }
-    if (!refers) continue;
-    group.Infix().clear();
-    group.Postfix().clear();
-    group.SetImageListDirty(true);
-    StoreGroup(goid);
+  std::vector<uint32_t> referrers;
+  for (const auto& [goid, group] : groups_) {
+    if (group.HasReference(folderOid, refFolder)) referrers.push_back(goid);
+  }
+  for (uint32_t goid : referrers) {
+    CVXGroup copy = groups_.at(goid);
+    copy.SetExpression(*this, "");
+    UpdateGroup(copy);
   }
 }
 

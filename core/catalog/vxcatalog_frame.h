@@ -12,23 +12,23 @@
 
 template <typename Body>
 unsigned CVXCatalog::Frame_(const char* name, int level, const std::string* objectName,
-                            bool catchVX, Body&& body) {
+                            EHandlers handlers, Body&& body) {
   CQRLLogfile* log = Log_();
   VX_LOGF(log, level, "+ CVXCatalog::%s", name);
   if (objectName) VX_LOGF(log, 4, "%s", objectName->c_str());
   unsigned rc = VX_OK;
-  try {
+  if (handlers == hNoHandlers) {
     rc = body();
-  } catch (CVXException* e) {
-    if (catchVX) {
-      rc = e->GetCode();
-    } else {
-      rc = VX_FRAMEWORK_EXCEPTION;
+  } else {
+    try {
+      rc = body();
+    } catch (CVXException* e) {
+      rc = handlers == hAllLevels ? e->GetCode() : VX_FRAMEWORK_EXCEPTION;
+      if (log) log->AddError(e, __LINE__, __FILE__);
+      delete e;
+    } catch (...) {
+      rc = VXCodeOfCurrentException(log, __LINE__, __FILE__);
     }
-    if (log) log->AddError(e, __LINE__, __FILE__);
-    delete e;
-  } catch (...) {
-    rc = VXCodeOfCurrentException(log, __LINE__, __FILE__);
   }
   if (rc != VX_OK) VX_ERROR(log, rc, "");
   VX_LOGF(log, level, "- CVXCatalog::%s", name);

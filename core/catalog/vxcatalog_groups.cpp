@@ -2,7 +2,6 @@
 // the assignment of files, each change written through.
 
 #include <algorithm>
-#include <functional>
 
 #include "VXGroupParser.h"
 #include "vxcatalog_frame.h"
@@ -153,7 +152,7 @@ unsigned CVXCatalog::GetPersSelOid(const std::string& /*name*/, uint32_t& oid) {
 
 unsigned CVXCatalog::AddGroup(const CVXGroup& group) {
   if (group.Oid() == 0) return VX_NOT_FOUND;
-  return Frame_("AddGroup", 3, &group.Name(), true, [&]() -> unsigned {
+  return Frame_("AddGroup", 3, &group.Name(), hAllLevels, [&]() -> unsigned {
     CVXGroup copy = group;
     if (copy.Parent() == VX_ALL_GROUP_OID) copy.Parent() = 0;
     uint32_t oid = copy.Oid();
@@ -176,7 +175,7 @@ unsigned CVXCatalog::AddGroup(const CVXGroup& group) {
 }
 
 unsigned CVXCatalog::UpdateGroup(const CVXGroup& group) {
-  return Frame_("UpdateGroup", 3, &group.Name(), true, [&]() -> unsigned {
+  return Frame_("UpdateGroup", 3, &group.Name(), hNoHandlers, [&]() -> unsigned {
     // Calculation and the data-driven build update categories on read-only stores too.
     if (store_.IsReadOnly()) return VX_OK;
     CVXGroup* record = GetGroup(group.Oid());
@@ -186,9 +185,10 @@ unsigned CVXCatalog::UpdateGroup(const CVXGroup& group) {
   });
 }
 
+// Exceptions pass: a failed removal of the record reaches the caller, with the category still
+// in the map and already unlinked from its parent.
 unsigned CVXCatalog::RemoveGroup(uint32_t oid) {
-  // A failed removal of the record throws past this operation to the caller.
-  std::function<unsigned()> body = [&]() -> unsigned {
+  return Frame_("RemoveGroup", 3, nullptr, hNoHandlers, [&]() -> unsigned {
     CVXGroup* record = GetGroup(oid);
     if (!record) return VX_NOT_FOUND;
     const std::vector<uint32_t> children = record->Children();
@@ -213,43 +213,38 @@ unsigned CVXCatalog::RemoveGroup(uint32_t oid) {
     if (unsigned rc = RemoveRecord_(rtGroup, oid); rc != VX_OK) VX_THROW(rc);
     groups_.erase(oid);
     return VX_OK;
-  };
-  CQRLLogfile* log = Log_();
-  VX_LOG(log, 3, "+ CVXCatalog::RemoveGroup");
-  unsigned rc = body();
-  if (rc != VX_OK) VX_ERROR(log, rc, "");
-  VX_LOG(log, 3, "- CVXCatalog::RemoveGroup");
-  return rc;
+  });
 }
 
+// Exceptions pass. The result is that of the last store: an assignment stored in the second
+// walk reports success even after a failed removal in the first.
 unsigned CVXCatalog::SetFileGroups(uint32_t fileOid, const std::vector<uint32_t>& groups,
                                    bool additive) {
-  CQRLLogfile* log = Log_();
-  VX_LOG(log, 3, "+ CVXCatalog::SetFileGroups");
-  unsigned rc = VX_OK;
-  auto store = [&](uint32_t oid) {
-    rc = StoreGroup(oid);
-    if (rc != VX_OK) {
-      VX_ERROR(log, rc, "SetFileGroups");
-      VX_WARN(log, "Cannot update group!");
+  return Frame_("SetFileGroups", 3, nullptr, hNoHandlers, [&]() -> unsigned {
+    unsigned rc = VX_OK;
+    auto store = [&](uint32_t oid) {
+      rc = StoreGroup(oid);
+      if (rc != VX_OK) {
+        VX_ERROR(Log_(), rc, "SetFileGroups");
+        VX_WARN(Log_(), "Cannot update group!");
+      }
+    };
+    if (!additive) {
+      for (auto& [oid, group] : groups_) {
+        if (fileOid >= group.Images().Size() || !group.Images().Get(fileOid)) continue;
+        group.RemoveImage(fileOid);
+        store(oid);
+      }
     }
-  };
-  if (!additive) {
-    for (auto& [oid, group] : groups_) {
-      if (fileOid >= group.Images().Size() || !group.Images().Get(fileOid)) continue;
-      group.RemoveImage(fileOid);
+    for (uint32_t oid : groups) {
+      CVXGroup* group = GetGroup(oid);
+      if (!group) continue;
+      group->AddImage(*this, fileOid);
       store(oid);
+      rc = VX_OK;
     }
-  }
-  for (uint32_t oid : groups) {
-    CVXGroup* group = GetGroup(oid);
-    if (!group) continue;
-    group->AddImage(*this, fileOid);
-    store(oid);
-    rc = VX_OK;
-  }
-  VX_LOG(log, 3, "- CVXCatalog::SetFileGroups");
-  return rc;
+    return rc;
+  });
 }
 
 // A category and everything below it, as bits; empty for 0 or when the subtree cannot be walked.

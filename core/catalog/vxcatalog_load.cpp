@@ -39,16 +39,7 @@ unsigned CVXCatalog::LoadFiles() {
     if ((rc = store_.GetSize(batch, total)) != VX_OK) break;
     file.Rewind();
     if ((rc = store_.Get(batch, file.GetBuffer(total), total)) != VX_OK) break;
-    try {
-      for (size_t i = at; i < end; ++i) {
-        CVXCatFile record;
-        file >> record;
-        files_.emplace_hint(files_.end(), oids[i], std::move(record));
-      }
-    } catch (...) {
-      rc = VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
-      break;
-    }
+    if ((rc = DecodeFiles_(file, oids, at, end)) != VX_OK) break;
     unsigned percent = Percent(end, oids.size());
     if (percent != lastPercent) Notify(cbmLoadProgress, percent, 0, nullptr);
     lastPercent = percent;
@@ -57,6 +48,22 @@ unsigned CVXCatalog::LoadFiles() {
   Notify(cbmLoadStageEnded, 0, 0, nullptr);
   if (rc != VX_OK) VX_ERROR(Log_(), rc, "Loading files");
   return rc;
+}
+
+// Each record is read straight into its map entry, which goes at the end: OIDs rise.
+unsigned CVXCatalog::DecodeFiles_(CVXMemFile& file, const std::vector<uint32_t>& oids, size_t at,
+                                  size_t end) {
+  for (size_t i = at; i < end; ++i) {
+    auto it = files_.emplace_hint(files_.end(), std::piecewise_construct,
+                                  std::forward_as_tuple(oids[i]), std::forward_as_tuple());
+    try {
+      file >> it->second;
+    } catch (...) {
+      files_.erase(it);
+      return VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
+    }
+  }
+  return VX_OK;
 }
 
 template <typename T>

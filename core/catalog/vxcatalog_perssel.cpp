@@ -37,13 +37,26 @@ unsigned CVXCatalog::InvalidatePersistantSelectionsForProps() {
   return InvalidatePersistantSelectionsForKey(nullptr);
 }
 
-unsigned CVXCatalog::MarkPersistantSelectionsDirty_(const char* /*key*/) {
+unsigned CVXCatalog::SelectionsUnreadable_() const {
   VX_ERROR(Log_(), VX_NOT_FOUND, "Persistent selections cannot be read by this build");
   return VX_NOT_FOUND;
 }
 
-void CVXCatalog::RemoveFileFromPersistantSelections_(uint32_t /*oid*/) {
-  VX_ERROR(Log_(), VX_NOT_FOUND, "Persistent selections cannot be read by this build");
+unsigned CVXCatalog::MarkPersistantSelectionsDirty_(const char* /*key*/) {
+  return SelectionsUnreadable_();
+}
+
+void CVXCatalog::RemoveFileFromPersistantSelections_(uint32_t /*oid*/) { SelectionsUnreadable_(); }
+
+// A store without selection records has nothing to clean; stored ones are left as they are,
+// since judging them empty or corrupt takes reading them.
+void CVXCatalog::CleanPersistantSelections_() {
+  std::vector<uint32_t> oids;
+  if (unsigned rc = store_.GetOids(rtPersSel, oids, false); rc != VX_OK) {
+    VX_ERROR(Log_(), rc, "Loading Persistant Selections");
+    return;
+  }
+  if (!oids.empty()) SelectionsUnreadable_();
 }
 
 unsigned CVXCatalog::RemoveFileTransform(uint32_t oid) { return RemoveRecord_(rtTransform, oid); }

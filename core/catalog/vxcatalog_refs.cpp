@@ -68,8 +68,9 @@ unsigned CVXCatalog::GetUnassignedImages(CBitVector& bits) {
     if (r == VX_OK) {
       assigned |= work;
     } else if (r != VX_FORMULA_CIRCULAR) {
-      VX_LOGF(Log_(), 1, "Failed to parse category %s with error %lu", copy.Name().c_str(),
-              static_cast<unsigned long>(r));
+      std::string text = "Failed to parse category " + copy.Name() + " with error " +
+                         std::to_string(static_cast<unsigned long>(r));
+      VX_ERROR(Log_(), r, text.c_str());
       rc = r;
       break;
     }
@@ -106,6 +107,32 @@ unsigned CVXCatalog::InvalidateDynamicGroups(uint32_t oid, const char* tag) {
     UpdateGroup(copy);
   }
   return VX_OK;
+}
+
+unsigned CVXCatalog::UpdateDynamicGroups(uint32_t oid, bool force, bool recalcChildren) {
+  std::vector<uint32_t> roots;
+  for (auto& [goid, group] : groups_) {
+    if ((oid != 0 && goid != oid) || !group.IsFTI()) continue;
+    if (group.IsFTIRoot()) {
+      if (force || group.NeedsRecalc()) roots.push_back(goid);
+    } else if (group.IsFTIChild() && force && !group.NeedsRecalc()) {
+      group.Flags() |= gfNeedsRecalc;
+      CVXGroup copy = group;
+      UpdateGroup(copy);
+    }
+  }
+  for (uint32_t root : roots) {
+    if (unsigned rc = BuildDynamicChildren_(root, force, recalcChildren); rc != VX_OK) return rc;
+  }
+  return VX_OK;
+}
+
+// The build queries the full-text index for the root's tag values; a build without that code
+// refuses rather than leave the root looking current.
+unsigned CVXCatalog::BuildDynamicChildren_(uint32_t /*rootOid*/, bool /*force*/,
+                                           bool /*recalcChildren*/) {
+  VX_ERROR(Log_(), VX_NOT_FOUND, "Data-driven categories cannot be built by this build");
+  return VX_NOT_FOUND;
 }
 
 unsigned CVXCatalog::ClearDynamicGroup(uint32_t oid) {

