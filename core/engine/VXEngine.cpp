@@ -5,6 +5,7 @@
 #include <ctime>
 
 #include "QRLLogfile.h"
+#include "Shape.h"
 #include "VXException.h"
 #include "VXFile.h"
 #include "VXFileSystem.h"
@@ -418,6 +419,7 @@ unsigned CVXEngine::Close() {
     VX_LOG(log_, 3, "    Plug-in modules unloaded");
   }
   thumbSizes_.clear();
+  shaper_.reset();
   VX_LOG(log_, 2, "Done");
   return rc;
 }
@@ -485,4 +487,5 @@ void CVXEngine::ReleaseCaches() {
   sortDB_.ReleaseCaches();
   std::lock_guard<std::recursive_mutex> lock(lock_);
   thumbSizes_.clear();
+  shaper_.reset();
 }

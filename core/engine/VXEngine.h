@@ -17,6 +17,7 @@ class CQRLLogfile;
 class CVXPropDB;
 class CVXXMPDB;
 class CVXBitmap;
+class CShape;
 class CVXProperty;
 class CVXTable;
 class CVXThumb;
@@ -278,14 +279,17 @@ class CVXEngine : public CVXBase {
 
   // ---- protected: files and folders ----
 
-  // Computes the shape data of `bitmap` and stores it as record 2/OID of `file`.
+  // Computes the shape data of `bitmap` and stores it as record 2/OID of `file`. A bitmap
+  // without pixels gives 10020 and stores nothing.
   unsigned ProcessFile(CVXCatFile& file, const CVXBitmap& bitmap, bool update, uint32_t crc);
   // Removal from every store but the catalog.
   unsigned RemoveDependendItems(uint32_t oid);
   unsigned RemoveFolderDependends(uint32_t oid, bool recursive);
   // The frame of a public operation: the lock (unless `locked` is false), "+ VXEngine::<name>"
-  // and "- VXEngine::<name>", exceptions of `body` turned into codes, a failure logged.
-  unsigned Framed_(const char* name, bool locked, const std::function<unsigned()>& body);
+  // and "- VXEngine::<name>", exceptions of `body` turned into codes, a failure logged; with
+  // `quietMiss` 10020 is an ordinary answer and is not logged.
+  unsigned Framed_(const char* name, bool locked, const std::function<unsigned()>& body,
+                   bool quietMiss = false);
   // The preamble without the disk check, for operations that free space.
   unsigned CheckMutableNoDisk_(bool logged = true) const;
 
@@ -294,6 +298,10 @@ class CVXEngine : public CVXBase {
   void RemoveImageFromPlugIns_(uint32_t oid);
   // Drops what AddFile wrote for a new OID that did not make it into the catalog.
   void ForgetNewFile_(uint32_t oid);
+  // Removes data that lies under `oid` in the stores although the catalog never listed it.
+  void ClearLeftovers_(uint32_t oid);
+  // A new file OID from the catalog, free of leftovers.
+  uint32_t NewFileOid_();
   // The first file of the folder named `name` by CVXCatFile::CompareNames, other than `skip`.
   uint32_t FindFileInFolder_(uint32_t folderOid, const std::string& name, uint32_t skip) const;
   unsigned AddFileFromThumb_(CVXCatFile& file, CVXThumb& thumb, const SVXDBRec_3& shape);
@@ -358,6 +366,9 @@ class CVXEngine : public CVXBase {
 
   // Width and height of thumbnails seen, by file OID; emptied by Close and ReleaseCaches.
   std::map<uint32_t, SThumbSize> thumbSizes_;
+  // The shape calculator of ProcessFile, kept so that its luminance buffer serves a run of
+  // images; made on first use, dropped by Close and ReleaseCaches. Used only under the lock.
+  std::unique_ptr<CShape> shaper_;
 
   // ---- state: names, selections, statistics ----
 };

@@ -38,7 +38,8 @@ int32_t Now() { return static_cast<int32_t>(std::time(nullptr)); }
 // ---------------------------------------------------------------------------------------------
 // Frame
 
-unsigned CVXEngine::Framed_(const char* name, bool locked, const std::function<unsigned()>& body) {
+unsigned CVXEngine::Framed_(const char* name, bool locked, const std::function<unsigned()>& body,
+                            bool quietMiss) {
   std::unique_lock<std::recursive_mutex> lock(lock_, std::defer_lock);
   if (locked) lock.lock();
   VX_LOGF(log_, 2, "+ VXEngine::%s", name);
@@ -49,7 +50,9 @@ unsigned CVXEngine::Framed_(const char* name, bool locked, const std::function<u
     rc = VXCodeOfCurrentException(log_, __LINE__, __FILE__);
   }
   VX_LOGF(log_, 2, "- VXEngine::%s", name);
-  if (rc != VX_OK) VX_ERROR(log_, rc, (std::string("VXEngine::") + name).c_str());
+  if (rc != VX_OK && !(quietMiss && rc == VX_NOT_FOUND)) {
+    VX_ERROR(log_, rc, (std::string("VXEngine::") + name).c_str());
+  }
   return rc;
 }
 
@@ -89,9 +92,11 @@ unsigned CVXEngine::ProcessFile(CVXCatFile& file, const CVXBitmap& bitmap, bool 
     data.CRC = crc;
     data.Flags = static_cast<uint16_t>(data.Flags & ~cfGreyscale);
     if (bitmap.IsGrayScale()) data.Flags |= cfGreyscale;
+    if (!shaper_) shaper_ = std::make_unique<CShape>();
     SVXDBRec_3 record{};  // the flag byte stays 0
-    CShape shape;
-    shape.CalcShapeInfo(bitmap, record.Info, kShapeThreshold);
+    // No pixels, no shape: storing the cleared record would make every such file match.
+    if (!shaper_->CalcShapeInfo(bitmap, record.Info, kShapeThreshold))
+      return unsigned{VX_NOT_FOUND};
     VX_LOG(log_, 3, update ? "Update" : "Insert");
     return matchDB_.Set(Sel(kShapeRecord, file.Oid()), &record, sizeof record);
   });
@@ -103,6 +108,26 @@ void CVXEngine::ForgetNewFile_(uint32_t oid) {
   thumbSizes_.erase(oid);
 }
 
+// A copy stores its data under the OID that the catalog is about to give it, before the catalog
+// record that takes the OID (see CopyFile_). A crash in between leaves data under an OID that
+// the catalog's counter has not passed, and the next new file would adopt it: its properties row
+// would refuse the host's AddImageProperties, and the source's XMP data would show on it. Every
+// new OID is therefore cleared first; a copy writes shape data, thumbnail and properties before
+// the XMP data, so a leftover always shows in one of those three.
+void CVXEngine::ClearLeftovers_(uint32_t oid) {
+  if (matchDB_.HasRecord(Sel(kShapeRecord, oid)) || thumbDB_.HasRecord(Sel(kThumbRecord, oid)) ||
+      propDB_->HasRecord(VX_IMAGE_PROPERTIES_TABLE, oid)) {
+    VX_WARN(log_, "Removing data of an unfinished copy");
+    RemoveDependendItems(oid);
+  }
+}
+
+uint32_t CVXEngine::NewFileOid_() {
+  uint32_t oid = catalog_.GenerateFileOID();
+  ClearLeftovers_(oid);
+  return oid;
+}
+
 unsigned CVXEngine::AddFile(CVXCatFile& file, const CVXBitmap& bitmap, uint32_t crc) {
   return Framed_("AddFile", true, [&] {
     unsigned rc = CheckMutable_(kFileSpace);
@@ -111,7 +136,7 @@ unsigned CVXEngine::AddFile(CVXCatFile& file, const CVXBitmap& bitmap, uint32_t 
     uint32_t folderOid = file.Properties().Folder;
     file.Oid() = catalog_.LookupFile(file.Name(), folderOid);
     bool existing = file.Oid() != 0;
-    if (!existing) file.Oid() = catalog_.GenerateFileOID();
+    if (!existing) file.Oid() = NewFileOid_();
     if ((rc = ProcessFile(file, bitmap, existing, crc)) != VX_OK) {
       VX_ERROR(log_, rc, "Preprocess failed");
       return rc;
@@ -137,7 +162,7 @@ unsigned CVXEngine::AddFileFromThumb_(CVXCatFile& file, CVXThumb& thumb, const S
   uint32_t folderOid = file.Properties().Folder;
   uint32_t oid = catalog_.LookupFile(file.Name(), folderOid);
   bool existing = oid != 0;
-  if (!existing) oid = catalog_.GenerateFileOID();
+  if (!existing) oid = NewFileOid_();
   file.Oid() = oid;
   file.Properties().Processed = Now();
   unsigned rc = matchDB_.Set(Sel(kShapeRecord, oid), &shape, sizeof shape);
@@ -335,6 +360,7 @@ unsigned CVXEngine::CopyFile_(uint32_t oid, uint32_t folderOid, unsigned long& n
   if (takeOver || !takeOverTarget) catalog_.GetFileGroups(takeOver ? target : oid, groups);
   uint32_t expected = catalog_.Header().LastFileOid + 1;
   try {
+    if (known) ClearLeftovers_(expected);
     if (known) CopyDependents_(oid, expected, takeOver);
   } catch (...) {
     RemoveDependendItems(expected);

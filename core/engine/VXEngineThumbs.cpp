@@ -97,19 +97,11 @@ unsigned CVXEngine::RemoveThumb(uint32_t oid) {
   });
 }
 
-// Not framed: a missing thumbnail is an everyday answer and is not logged.
+// A missing thumbnail is an everyday answer and is not logged.
 unsigned CVXEngine::GetThumb(uint32_t oid, CVXThumb& thumb) {
-  std::lock_guard<std::recursive_mutex> lock(lock_);
-  VX_LOG(log_, 2, "+ VXEngine::GetThumb");
-  unsigned rc = VX_NOT_FOUND;
-  try {
-    if (oid != 0) rc = ReadThumb_(oid, thumb);
-  } catch (...) {
-    rc = VXCodeOfCurrentException(log_, __LINE__, __FILE__);
-  }
-  VX_LOG(log_, 2, "- VXEngine::GetThumb");
-  if (rc != VX_OK && rc != VX_NOT_FOUND) VX_ERROR(log_, rc, "VXEngine::GetThumb");
-  return rc;
+  return Framed_(
+      "GetThumb", true, [&] { return oid == 0 ? unsigned{VX_NOT_FOUND} : ReadThumb_(oid, thumb); },
+      true);
 }
 
 bool CVXEngine::ThumbSize_(uint32_t oid, SThumbSize& size) {

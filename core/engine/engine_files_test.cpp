@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <sqlite3.h>
 
 #include <cstring>
 #include <string>
@@ -118,6 +119,42 @@ TEST_F(EngineFilesTest, AddFileIntoAnUnknownFolderLeavesNothingBehind) {
   EXPECT_GT(ready.Oid(), file.Oid());
 }
 
+TEST_F(EngineFilesTest, AnyBitmapWithPixelsIsProcessedAndAnEmptyOneRefused) {
+  const uint32_t sizes[][2] = {{1, 1}, {70000, 1}, {1, 70000}, {3, 50001}};
+  CShape shape;
+  for (const auto& s : sizes) {
+    CVXBitmap bitmap = MakeBitmap(s[0], s[1], s[0] + s[1]);
+    CVXCatFile file(0, std::to_string(s[0]) + "x" + std::to_string(s[1]), pics_);
+    ASSERT_EQ(engine_.AddFile(file, bitmap, 1), VX_OK) << file.Name();
+    SVXDBRec_3 expected{};
+    ASSERT_TRUE(shape.CalcShapeInfo(bitmap, expected.Info, 127));
+    std::vector<uint8_t> stored = ShapeBytes(file.Oid());
+    ASSERT_EQ(stored.size(), sizeof expected);
+    EXPECT_EQ(std::memcmp(stored.data(), &expected, sizeof expected), 0) << file.Name();
+  }
+
+  // No pixels: a code, no shape record, no catalog record; the new OID is spent.
+  CVXCatFile empty(0, "empty.jpg", pics_);
+  log_.ClearCaptured();
+  EXPECT_EQ(engine_.AddFile(empty, CVXBitmap(), 1), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Preprocess failed"));
+  EXPECT_NE(empty.Oid(), 0u);
+  EXPECT_TRUE(Gone(empty.Oid()));
+  CVXCatFile noRows(0, "norows.jpg", pics_);
+  EXPECT_EQ(engine_.AddFile(noRows, CVXBitmap(500, 0), 1), VX_NOT_FOUND);
+
+  // SetFile with an empty bitmap keeps the shape data and the record as they were.
+  uint32_t oid = AddFile(pics_, "kept.jpg", 3);
+  std::vector<uint8_t> before = ShapeBytes(oid);
+  CVXCatFile file = File(oid);
+  file.Properties().Size = 99;
+  CVXBitmap none;
+  EXPECT_EQ(engine_.SetFile(file, &none, 5), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Processing file in SetFile"));
+  EXPECT_EQ(ShapeBytes(oid), before);
+  EXPECT_NE(File(oid).Properties().Size, 99u);
+}
+
 TEST_F(EngineFilesTest, AddFileFromThumbAndShapeAddsAndUpdates) {
   CVXCatFile file(0, "x.png", pics_);
   file.Properties().Processed = 0;
@@ -201,6 +238,28 @@ TEST_F(EngineFilesTest, RemoveFolderTakesSubFoldersAndTheirFilesFromEveryStore) 
   EXPECT_TRUE(log_.Has("Removing folder dependends"));
 }
 
+// Only the XMP deletions are transactional: when the catalog keeps the folder they come back,
+// while the other stores have lost the files' data (self test's matter).
+TEST_F(EngineFilesTest, RemoveFolderRollsBackXMPWhenTheCatalogKeepsTheFolder) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  uint32_t b = AddFullFile(pics_, "b.jpg", 2);
+  sqlite3* catalog = engine_.Catalog().BlobDB().Handle();
+  ASSERT_EQ(sqlite3_exec(catalog, "PRAGMA query_only=1", nullptr, nullptr, nullptr), SQLITE_OK);
+  log_.ClearCaptured();
+  EXPECT_NE(engine_.RemoveFolder(pics_), VX_OK);
+  EXPECT_TRUE(log_.Has("Removing folder from catalog"));
+  ASSERT_EQ(sqlite3_exec(catalog, "PRAGMA query_only=0", nullptr, nullptr, nullptr), SQLITE_OK);
+  for (uint32_t oid : {a, b}) {
+    EXPECT_EQ(XMPPacket(oid), oid == a ? "a.jpg" : "b.jpg");
+    std::vector<SFTIRecord> fti;
+    ASSERT_EQ(engine_.GetXMPFTI(oid, fti), VX_OK);
+    EXPECT_EQ(fti.size(), 1u);
+    EXPECT_TRUE(ShapeBytes(oid).empty());
+  }
+  EXPECT_EQ(engine_.RemoveFolder(pics_), VX_OK);
+  EXPECT_TRUE(Gone(a) && Gone(b));
+}
+
 TEST_F(EngineFilesTest, MoveFileKeepsTheOidAndReplacesATarget) {
   uint32_t a = AddFullFile(pics_, "a.jpg", 1);
   uint32_t b = AddFullFile(other_, "b.jpg", 2);
@@ -280,17 +339,50 @@ TEST_F(EngineFilesTest, FailedCopyLeavesNoHalfCopy) {
   EXPECT_EQ(copy, 0u);
   EXPECT_EQ(engine_.CopyFile(999, other_, copy, "x.jpg", false), VX_NOT_FOUND);
 
-  // A stale property row under the next OID makes the property copy fail.
+  // The property store refuses to write: the copy fails after its shape data and thumbnail
+  // went in, and they go again with the catalog record.
   uint32_t next = engine_.Catalog().Header().LastFileOid + 1;
-  unsigned long key = next;
-  ASSERT_EQ(
-      engine_.GetPropertyDatabase().AddRecord(VX_IMAGE_PROPERTIES_TABLE, key, MakeRow(0, 1), true),
-      VX_OK);
-  EXPECT_EQ(engine_.CopyFile(a, other_, copy, "x.jpg", false), VX_ALREADY_PRESENT);
+  sqlite3* props = engine_.GetPropertyDatabase().BlobDB().Handle();
+  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=1", nullptr, nullptr, nullptr), SQLITE_OK);
+  EXPECT_NE(engine_.CopyFile(a, other_, copy, "x.jpg", false), VX_OK);
+  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=0", nullptr, nullptr, nullptr), SQLITE_OK);
   EXPECT_EQ(copy, 0u);
   EXPECT_TRUE(Gone(next));
   EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
   EXPECT_FALSE(Gone(a));
+}
+
+// A copy cut short by a crash leaves data under the OID the catalog hands out next. Neither a
+// new file nor the next copy takes it over.
+TEST_F(EngineFilesTest, LeftoversOfAnUnfinishedCopyAreNotAdopted) {
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  auto leaveBehind = [&](uint32_t oid) {
+    SVXDBRec_3 shape = MakeShape(99);
+    ASSERT_EQ(engine_.MatchStore().Set({2, oid}, &shape, sizeof shape), VX_OK);
+    unsigned long key = oid;
+    ASSERT_EQ(engine_.GetPropertyDatabase().AddRecord(VX_IMAGE_PROPERTIES_TABLE, key,
+                                                      MakeRow(50, 2), true),
+              VX_OK);
+    SetXMP(oid, "stale");
+  };
+
+  uint32_t next = engine_.Catalog().Header().LastFileOid + 1;
+  leaveBehind(next);
+  CVXCatFile file(0, "new.jpg", pics_);
+  ASSERT_EQ(engine_.AddFile(file, MakeBitmap(8, 8, 2), 2), VX_OK);
+  ASSERT_EQ(file.Oid(), next);
+  EXPECT_TRUE(Properties(next).empty());
+  EXPECT_EQ(XMPPacket(next), "");
+  EXPECT_EQ(engine_.AddImageProperties(next, MakeRow(7, 2)), VX_OK);
+
+  next = engine_.Catalog().Header().LastFileOid + 1;
+  leaveBehind(next);
+  unsigned long copy = 0;
+  ASSERT_EQ(engine_.CopyFile(a, other_, copy, "", false), VX_OK);
+  ASSERT_EQ(copy, next);
+  EXPECT_EQ(Properties(next), MakeRow(1, 2));
+  EXPECT_EQ(XMPPacket(next), "a.jpg");
+  EXPECT_EQ(ShapeBytes(next), ShapeBytes(a));
 }
 
 TEST_F(EngineFilesTest, SetFileUpdatesTheRecordAndWithABitmapTheShape) {

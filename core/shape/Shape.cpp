@@ -47,23 +47,16 @@ inline uint8_t Luma(SVXColor p) {
 }
 
 #if defined(__SSE2__)
-// 30 r + 59 g + 11 b of four pixels, as four 32-bit lanes.
-inline __m128i WeightedSum4(__m128i pixels) {
-  const __m128i zero = _mm_setzero_si128();
+// 30 r + 59 g + 11 b of four pixels given as 16-bit lanes r g b a r g b a (two vectors), as four
+// 32-bit lanes.
+inline __m128i WeightedSum4(__m128i lo, __m128i hi) {
   const __m128i weights = _mm_setr_epi16(30, 59, 11, 0, 30, 59, 11, 0);
   // Each pixel gives two lanes, 30 r + 59 g and 11 b; adding the even lanes to the odd ones
   // completes it.
-  const __m128 lo = _mm_castsi128_ps(_mm_madd_epi16(_mm_unpacklo_epi8(pixels, zero), weights));
-  const __m128 hi = _mm_castsi128_ps(_mm_madd_epi16(_mm_unpackhi_epi8(pixels, zero), weights));
-  return _mm_add_epi32(_mm_castps_si128(_mm_shuffle_ps(lo, hi, _MM_SHUFFLE(2, 0, 2, 0))),
-                       _mm_castps_si128(_mm_shuffle_ps(lo, hi, _MM_SHUFFLE(3, 1, 3, 1))));
-}
-
-// Sum of the bytes of `channel` (0 red, 8 green, 16 blue) of four pixels, into two 64-bit lanes.
-inline __m128i ChannelSum4(__m128i pixels, int channel) {
-  const __m128i low = _mm_set1_epi32(0xFF);
-  return _mm_sad_epu8(_mm_and_si128(_mm_srl_epi32(pixels, _mm_cvtsi32_si128(channel)), low),
-                      _mm_setzero_si128());
+  const __m128 a = _mm_castsi128_ps(_mm_madd_epi16(lo, weights));
+  const __m128 b = _mm_castsi128_ps(_mm_madd_epi16(hi, weights));
+  return _mm_add_epi32(_mm_castps_si128(_mm_shuffle_ps(a, b, _MM_SHUFFLE(2, 0, 2, 0))),
+                       _mm_castps_si128(_mm_shuffle_ps(a, b, _MM_SHUFFLE(3, 1, 3, 1))));
 }
 
 inline uint64_t Lanes(__m128i v) {
@@ -78,23 +71,30 @@ inline uint64_t Lanes(__m128i v) {
 void ScanPixels(const SVXColor* px, uint32_t n, uint8_t* luma, uint64_t (&sums)[3]) {
   uint32_t x = 0;
 #if defined(__SSE2__)
+  const __m128i zero = _mm_setzero_si128();
   // x / 100 = (x * 5243) >> 19 for every x up to 25500, the largest weighted sum.
   const __m128i div100 = _mm_set1_epi16(5243);
-  __m128i r = _mm_setzero_si128(), g = r, b = r;
-  for (; n - x >= 8; x += 8) {
-    const __m128i p0 = _mm_loadu_si128(reinterpret_cast<const __m128i*>(px + x));
-    const __m128i p1 = _mm_loadu_si128(reinterpret_cast<const __m128i*>(px + x + 4));
-    r = _mm_add_epi64(r, _mm_add_epi64(ChannelSum4(p0, 0), ChannelSum4(p1, 0)));
-    g = _mm_add_epi64(g, _mm_add_epi64(ChannelSum4(p0, 8), ChannelSum4(p1, 8)));
-    b = _mm_add_epi64(b, _mm_add_epi64(ChannelSum4(p0, 16), ChannelSum4(p1, 16)));
-    const __m128i weighted = _mm_packs_epi32(WeightedSum4(p0), WeightedSum4(p1));
-    const __m128i l = _mm_srli_epi16(_mm_mulhi_epu16(weighted, div100), 3);
-    _mm_storel_epi64(reinterpret_cast<__m128i*>(luma + x),
-                     _mm_packus_epi16(l, _mm_setzero_si128()));
+  while (n - x >= 8) {
+    // The colour sums run in 16-bit lanes r g b a r g b a. Eight pixels add at most 4 * 255 to
+    // a lane, so a block of 64 such steps stays below 65536 before it is folded into `sums`.
+    const uint32_t steps = std::min<uint32_t>((n - x) / 8, 64);
+    __m128i acc = zero;
+    for (uint32_t i = 0; i < steps; ++i, x += 8) {
+      const __m128i p0 = _mm_loadu_si128(reinterpret_cast<const __m128i*>(px + x));
+      const __m128i p1 = _mm_loadu_si128(reinterpret_cast<const __m128i*>(px + x + 4));
+      const __m128i a = _mm_unpacklo_epi8(p0, zero), b = _mm_unpackhi_epi8(p0, zero);
+      const __m128i c = _mm_unpacklo_epi8(p1, zero), d = _mm_unpackhi_epi8(p1, zero);
+      acc = _mm_add_epi16(acc, _mm_add_epi16(_mm_add_epi16(a, b), _mm_add_epi16(c, d)));
+      const __m128i weighted = _mm_packs_epi32(WeightedSum4(a, b), WeightedSum4(c, d));
+      const __m128i l = _mm_srli_epi16(_mm_mulhi_epu16(weighted, div100), 3);
+      _mm_storel_epi64(reinterpret_cast<__m128i*>(luma + x), _mm_packus_epi16(l, zero));
+    }
+    uint16_t lanes[8];
+    _mm_storeu_si128(reinterpret_cast<__m128i*>(lanes), acc);
+    sums[0] += uint32_t{lanes[0]} + lanes[4];
+    sums[1] += uint32_t{lanes[1]} + lanes[5];
+    sums[2] += uint32_t{lanes[2]} + lanes[6];
   }
-  sums[0] += Lanes(r);
-  sums[1] += Lanes(g);
-  sums[2] += Lanes(b);
 #endif
   for (; x < n; ++x) {
     sums[0] += px[x].R;
@@ -177,17 +177,17 @@ uint32_t FirstBrightLuma(const SCellSums& s, uint64_t n, unsigned char threshold
 }
 
 // Means truncated to bytes and converted; the integer quotient equals the truncated double one
-// for every count an image can have. Shape is the exact integer percent of the nominal cell area:
-// the floating form bright / (cw * ch * 0.01) falls just below 100 for areas such as 7, 14 or 17
-// and would score a wholly bright cell 99.
+// for every count an image can have. Shape is the bright count over one percent of the nominal
+// cell area, in double and truncated: that is the definition of the stored value, kept although
+// a wholly bright cell of area 7, 14, 17 and others comes out just below 100 and is stored as 99.
 void FinishCells(const SGrid& g, const SCellSums& s, SVXMatchInfo& info) {
-  const uint64_t area = uint64_t{g.CW} * g.CH;
+  const double percent = static_cast<double>(uint64_t{g.CW} * g.CH) * 0.01;
   for (uint32_t i = 0; i < kCells; ++i) {
     const uint64_t count = std::max<uint64_t>(s.Count[i], 1);
     SVXMatchInfo::SCell& c = info.Cells[i];
     RGB2C3(static_cast<unsigned>(s.R[i] / count), static_cast<unsigned>(s.G[i] / count),
            static_cast<unsigned>(s.B[i] / count), c.C1, c.C2, c.C3);
-    c.Shape = static_cast<uint8_t>(s.Bright[i] * 100 / area);
+    c.Shape = static_cast<uint8_t>(static_cast<double>(s.Bright[i]) / percent);
   }
 }
 

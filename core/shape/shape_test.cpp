@@ -5,6 +5,7 @@
 #include <array>
 #include <cstring>
 #include <random>
+#include <tuple>
 #include <vector>
 
 #include "VexoraSettings.h"
@@ -41,7 +42,8 @@ SVXMatchInfo ReferenceShape(const CVXBitmap& bitmap, unsigned char threshold) {
     const double k = count[i] ? double(count[i]) : 1.0;
     const int mr = int(r[i] / k), mg = int(g[i] / k), mb = int(b[i] / k);
     info.Cells[i] = {uint8_t((mr + mg + mb) / 3), uint8_t((mr - mb + 255) / 2),
-                     uint8_t((mr + 2 * (255 - mg) + mb) / 4), uint8_t(bright[i] * 100 / (cw * ch))};
+                     uint8_t((mr + 2 * (255 - mg) + mb) / 4),
+                     uint8_t(double(bright[i]) / (cw * ch * 0.01))};
   }
   return info;
 }
@@ -103,10 +105,15 @@ TEST(ShapeTest, UniformImagesAndCellsAtTheEdge) {
   using C = std::array<int, 4>;
   CShape shape;
   SVXMatchInfo info;
-  // Every full cell is wholly bright, also where the area is 7 (cells of 1 x 7 in 20 x 140).
-  for (const auto& size : {std::pair{200u, 100u}, std::pair{20u, 140u}}) {
-    ASSERT_TRUE(shape.CalcShapeInfo(Uniform(size.first, size.second, 90, 90, 90), info, 127));
-    for (int i = 0; i < 400; ++i) ASSERT_EQ(Cell(info, i / 20, i % 20), (C{90, 127, 127, 100}));
+  // Every full cell is wholly bright. Shape is bright / (area * 0.01) in double, truncated: for
+  // cells of 1 x 7 (20 x 140) that is 7 / 0.07, just below 100, so 99.
+  const std::tuple<uint32_t, uint32_t, int> uniform[] = {
+      {200, 100, 100}, {20, 140, 99}, {60, 140, 100}, {20, 340, 99}};
+  for (const auto& [w, h, percent] : uniform) {
+    ASSERT_TRUE(shape.CalcShapeInfo(Uniform(w, h, 90, 90, 90), info, 127));
+    for (int i = 0; i < 400; ++i) {
+      ASSERT_EQ(Cell(info, i / 20, i % 20), (C{90, 127, 127, percent})) << w << "x" << h;
+    }
   }
   ASSERT_TRUE(shape.CalcShapeInfo(Uniform(40, 40, 255, 255, 255), info, 127));
   EXPECT_EQ(Cell(info, 19, 19), (C{255, 127, 127, 100}));
