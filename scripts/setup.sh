@@ -6,8 +6,12 @@ packages=(
   libsqlite3-dev libre2-dev libicu-dev libgtest-dev libgmock-dev libbenchmark-dev
   # the vx host: decoding and thumbnails, metadata, command line, CRC-32
   libvips-dev libexiv2-dev libcli11-dev zlib1g-dev
-  # its demo collection: real photographs shipped by Debian
-  mate-backgrounds
+  # its demo collection: real photographs shipped by Debian, and the vips command that derives
+  # near-duplicates from them
+  mate-backgrounds libvips-tools
+  # the host's end-to-end tests open its HTML report in a headless browser; its benchmark
+  # compares with another similar-image finder
+  chromium findimagedupes
 )
 missing=()
 for p in "${packages[@]}"; do

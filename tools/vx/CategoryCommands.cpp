@@ -10,13 +10,41 @@ namespace vx {
 namespace {
 
 // Opens the database for writing and finds the category; prints why not.
-int OpenWithCategory(Database& db, const std::string& path, const std::string& name,
-                     bool readOnly, uint32_t* oid) {
+int OpenWithCategory(Database& db, const std::string& path, const std::string& name, bool readOnly,
+                     uint32_t* oid) {
   if (!db.Open(path, readOnly)) return kExitFailure;
   *oid = db.FindCategory(name);
   if (*oid != 0) return kExitOk;
   std::fprintf(stderr, "vx: no category %s\n", name.c_str());
   return kExitNotFound;
+}
+
+// A tag value as the full-text index's exact query takes it: in double quotes, inner ones
+// doubled.
+std::string QuotedLiteral(const std::string& value) {
+  std::string quoted = "\"";
+  for (char c : value) quoted += c == '"' ? std::string("\"\"") : std::string(1, c);
+  return quoted + "\"";
+}
+
+// What a formula error code means to someone typing a formula.
+const char* FormulaErrorText(unsigned code) {
+  switch (code) {
+    case 15004:
+      return "\")\" without \"(\"";
+    case 15005:
+      return "\"(\" without \")\"";
+    case 15010:
+      return "no such category";
+    case 15011:
+      return "no such folder";
+    case 15012:
+      return "no such saved selection";
+    case 15014:
+      return "the category would depend on itself";
+    default:
+      return "syntax error: operands are quoted, operators are AND, OR and the binary NOT";
+  }
 }
 
 }  // namespace
@@ -55,7 +83,8 @@ int CategoryFormulaCommand(const std::string& path, const std::string& name,
   db.engine().GetGroup(oid, group);
   const SError error = group.SetExpression(db.catalog(), formula);
   if (error.code != VX_OK) {
-    std::fprintf(stderr, "vx: formula error %u at %d\n", error.code, error.position);
+    std::fprintf(stderr, "vx: formula error %u at %d: %s\n", error.code, error.position,
+                 FormulaErrorText(error.code));
     return kExitUsage;
   }
   if (unsigned rc = db.engine().SetGroup(group); rc != VX_OK) {
@@ -125,20 +154,31 @@ int CategoryTreeCommand(const std::string& path, bool json) {
     for (const CVXGroup& group : children[parent]) {
       std::vector<uint32_t> files;
       db.engine().GetGroupImages(group.Oid(), files);
+      // The values of a tag-driven category, each with the number of files that carry it.
       std::vector<std::string> values;
       if (group.IsFTIRoot()) db.engine().GroupXMPFTITags(group.FTITag(), values, 0, 0);
+      std::vector<size_t> counts;
+      for (const std::string& v : values) {
+        std::vector<uint32_t> carriers;
+        db.engine().FindXMPFTI(group.FTITag().c_str(), QuotedLiteral(v).c_str(), 0, carriers, 0, 0);
+        counts.push_back(carriers.size());
+      }
       if (json) {
         w.BeginObject().Key("oid").UInt(group.Oid()).Key("name").String(group.Name());
         w.Key("files").UInt(files.size()).Key("formula").String(group.Expression(db.catalog()));
         w.Key("values").BeginArray();
-        for (const std::string& v : values) w.String(v);
+        for (size_t i = 0; i < values.size(); ++i) {
+          w.BeginObject().Key("value").String(values[i]).Key("files").UInt(counts[i]).EndObject();
+        }
         w.EndArray().Key("children").BeginArray();
         walk(group.Oid(), depth + 1);
         w.EndArray().EndObject();
         continue;
       }
       std::printf("%*s%s (%zu)\n", depth * 2, "", group.Name().c_str(), files.size());
-      for (const std::string& v : values) std::printf("%*s%s\n", depth * 2 + 2, "", v.c_str());
+      for (size_t i = 0; i < values.size(); ++i) {
+        std::printf("%*s= %s (%zu)\n", depth * 2 + 2, "", values[i].c_str(), counts[i]);
+      }
       walk(group.Oid(), depth + 1);
     }
   };

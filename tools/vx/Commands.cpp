@@ -25,15 +25,19 @@ void PrintCounts(const ImportCounts& c, bool json) {
   if (json) {
     vxhost::JsonWriter w(std::cout);
     w.BeginObject().Key("imported").UInt(c.imported).Key("updated").UInt(c.updated);
-    w.Key("unchanged").UInt(c.unchanged).Key("skipped").UInt(c.skipped).EndObject();
+    w.Key("unchanged").UInt(c.unchanged).Key("skipped").UInt(c.skipped);
+    const ImportTimes& t = c.times;
+    w.Key("seconds").BeginObject().Key("wall").Double(t.wall).Key("crc").Double(t.crc);
+    w.Key("decode").Double(t.decode).Key("metadata").Double(t.metadata);
+    w.Key("thumbnail").Double(t.thumbnail).Key("library").Double(t.library).EndObject();
+    w.EndObject();
     std::cout << "\n";
     return;
   }
-  std::printf("imported %llu, updated %llu, unchanged %llu, skipped %llu\n",
-              static_cast<unsigned long long>(c.imported),
-              static_cast<unsigned long long>(c.updated),
-              static_cast<unsigned long long>(c.unchanged),
-              static_cast<unsigned long long>(c.skipped));
+  std::printf(
+      "imported %llu, updated %llu, unchanged %llu, skipped %llu\n",
+      static_cast<unsigned long long>(c.imported), static_cast<unsigned long long>(c.updated),
+      static_cast<unsigned long long>(c.unchanged), static_cast<unsigned long long>(c.skipped));
 }
 
 // Name and value of every column that holds one.
@@ -158,7 +162,8 @@ int InfoCommand(const std::string& path, const std::string& name, bool json) {
     w.EndObject().Key("xmp").BeginObject();
     w.Key("rating").Int(hasXmp ? xmp.Rating : 0).Key("label").String(xmp.Label);
     w.Key("packetBytes").UInt(xmp.Packet.size()).EndObject().Key("tags").BeginArray();
-    for (const SFTIRecord& t : tags) w.BeginObject().Key("tag").String(t.Tag).Key("value").String(t.Value).EndObject();
+    for (const SFTIRecord& t : tags)
+      w.BeginObject().Key("tag").String(t.Tag).Key("value").String(t.Value).EndObject();
     w.EndArray().EndObject();
     std::cout << "\n";
     return kExitOk;
@@ -170,10 +175,11 @@ int InfoCommand(const std::string& path, const std::string& name, bool json) {
   if (embedded) std::printf("taken         %s\n", TimeText(d.EmbeddedTime).c_str());
   for (const auto& [key, value] : properties) std::printf("%-13s %s\n", key.c_str(), value.c_str());
   if (hasXmp && (xmp.Rating != 0 || !xmp.Label.empty() || !xmp.Packet.empty())) {
-    std::printf("xmp           rating %d, label \"%s\", %zu bytes\n", xmp.Rating,
-                xmp.Label.c_str(), xmp.Packet.size());
+    std::printf("xmp           rating %d, label \"%s\", %zu bytes\n", xmp.Rating, xmp.Label.c_str(),
+                xmp.Packet.size());
   }
-  for (const SFTIRecord& t : tags) std::printf("tag           %s = %s\n", t.Tag.c_str(), t.Value.c_str());
+  for (const SFTIRecord& t : tags)
+    std::printf("tag           %s = %s\n", t.Tag.c_str(), t.Value.c_str());
   return kExitOk;
 }
 

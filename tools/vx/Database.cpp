@@ -1,5 +1,6 @@
 #include "Database.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <filesystem>
 #include <system_error>
@@ -43,6 +44,11 @@ bool Database::Create(const std::string& path, uint32_t thumbSide, uint32_t thum
   }
   CVXTable table;
   return EnsurePropertyTable(&table);
+}
+
+uint32_t Database::DecodeSide() {
+  const SVXThumbInfoNew info = engine_.GetThumbInfo();
+  return std::clamp<uint32_t>(std::max(info.Width, info.Height), 256, 1024);
 }
 
 bool Database::Open(const std::string& path, bool readOnly) {

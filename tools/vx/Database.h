@@ -54,6 +54,12 @@ class Database {
   uint32_t FindFolder(const std::string& path);
   // A category by full name ("Trips.Alps") or OID; 0 when there is none.
   uint32_t FindCategory(const std::string& nameOrOid);
+  // How big the importer decodes this database's images: at the thumbnail's side, so that the
+  // thumbnail is the decoded image itself, but at least 256 and at most 1024 pixels. The shape
+  // record needs far less, and JPEG shrinks on load by powers of two, so decoding no larger
+  // than needed is the largest saving an import can make. Outside images for a search decode
+  // the same way, so that their shape records compare on equal terms.
+  uint32_t DecodeSide();
   // The stored thumbnail's bytes; empty when the file has none.
   std::vector<uint8_t> Thumbnail(uint32_t oid);
   // Every file of the catalog, rising OIDs.

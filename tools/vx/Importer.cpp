@@ -1,7 +1,9 @@
 #include "Importer.h"
 
 #include <algorithm>
+#include <chrono>
 #include <filesystem>
+#include <optional>
 #include <thread>
 
 #include "FileCrc.h"
@@ -21,12 +23,30 @@ CVXProperty Text(const std::string& text) { return text.empty() ? CVXProperty() 
 
 CVXProperty Positive(double value) { return value > 0 ? CVXProperty(value) : CVXProperty(); }
 
+using Clock = std::chrono::steady_clock;
+
+double Seconds(Clock::duration d) { return std::chrono::duration<double>(d).count(); }
+
 }  // namespace
+
+template <typename Step>
+auto Importer::Timed_(Stage stage, Step step) {
+  const Clock::time_point start = Clock::now();
+  auto result = step();
+  nanos_[stage] +=
+      std::chrono::duration_cast<std::chrono::nanoseconds>(Clock::now() - start).count();
+  return result;
+}
 
 Importer::Importer(Database* db, const CVXTable& table, const ImportOptions& options)
     : db_(db), table_(table), options_(options) {}
 
 ImportCounts Importer::Run(const std::vector<std::string>& roots) {
+  const Clock::time_point start = Clock::now();
+  thumbInfo_ = db_->engine().GetThumbInfo();
+  vxhost::DecodeOptions decodeOptions;
+  decodeOptions.maxSide = db_->DecodeSide();
+  decoder_ = vxhost::ImageDecoder(decodeOptions);
   std::vector<uint32_t> known;
   db_->engine().GetFolders(known);
   CVXFolder folder;
@@ -44,13 +64,15 @@ ImportCounts Importer::Run(const std::vector<std::string>& roots) {
 
   vxhost::Progress::Options progressOptions;
   progressOptions.mode = options_.progress;
-  vxhost::Progress progress(stderr, "import", tasks_.size(), progressOptions);
+  std::optional<vxhost::Progress> progress;
+  if (options_.showProgress) progress.emplace(stderr, "import", tasks_.size(), progressOptions);
+  vxhost::Progress* shown = progress ? &*progress : nullptr;
   unsigned threads = options_.threads ? options_.threads : std::thread::hardware_concurrency();
   threads = std::clamp<unsigned>(threads, 1, std::max<size_t>(tasks_.size(), 1));
   std::vector<std::thread> pool;
-  for (unsigned i = 0; i < threads; ++i) pool.emplace_back([&] { Work_(&progress); });
+  for (unsigned i = 0; i < threads; ++i) pool.emplace_back([&] { Work_(shown); });
   for (std::thread& t : pool) t.join();
-  if (options_.showProgress) progress.Finish();
+  if (shown) shown->Finish();
   db_->engine().Flush();
 
   ImportCounts counts;
@@ -58,6 +80,10 @@ ImportCounts Importer::Run(const std::vector<std::string>& roots) {
   counts.updated = counts_[static_cast<int>(Outcome::kUpdated)];
   counts.unchanged = counts_[static_cast<int>(Outcome::kUnchanged)];
   counts.skipped = counts_[static_cast<int>(Outcome::kSkipped)];
+  counts.times.wall = Seconds(Clock::now() - start);
+  double* stages[kStages] = {&counts.times.crc, &counts.times.decode, &counts.times.metadata,
+                             &counts.times.thumbnail, &counts.times.library};
+  for (int i = 0; i < kStages; ++i) *stages[i] = static_cast<double>(nanos_[i]) * 1e-9;
   return counts;
 }
 
@@ -125,13 +151,13 @@ void Importer::Work_(vxhost::Progress* progress) {
   for (size_t i = next_++; i < tasks_.size(); i = next_++) {
     Outcome outcome = Import_(tasks_[i]);
     ++counts_[static_cast<int>(outcome)];
-    if (options_.showProgress) progress->Add();
+    if (progress) progress->Add();
   }
 }
 
 Importer::Outcome Importer::Import_(Task& task) {
   uint32_t crc = 0;
-  if (vxhost::HostStatus s = vxhost::ComputeFileCrc(task.path, &crc); !s.ok()) {
+  if (auto s = Timed_(kCrc, [&] { return vxhost::ComputeFileCrc(task.path, &crc); }); !s.ok()) {
     Fail_(task, s.ToString());
     return Outcome::kSkipped;
   }
@@ -140,13 +166,22 @@ Importer::Outcome Importer::Import_(Task& task) {
     return Outcome::kUnchanged;
   }
   vxhost::DecodedImage image;
-  if (vxhost::HostStatus s = decoder_.Decode(task.path, &image); !s.ok()) {
+  if (auto s = Timed_(kDecode, [&] { return decoder_.Decode(task.path, &image); }); !s.ok()) {
     Fail_(task, s.ToString());
     return Outcome::kSkipped;
   }
   // Metadata are a bonus: an image whose metadata do not read is imported without them.
   vxhost::ImageMetadata meta;
-  if (!vxhost::MetadataReader::Read(task.path, &meta).ok()) meta = vxhost::ImageMetadata();
+  if (!Timed_(kMetadata, [&] { return vxhost::MetadataReader::Read(task.path, &meta); }).ok()) {
+    meta = vxhost::ImageMetadata();
+  }
+  vxhost::EncodedJpeg thumbnail;
+  const vxhost::HostStatus encoded =
+      Timed_(kThumbnail, [&] { return Thumbnail_(image, &thumbnail); });
+  if (!encoded.ok()) {
+    Fail_(task, "thumbnail: " + encoded.ToString());
+    return Outcome::kSkipped;
+  }
 
   if (!task.exists) task.record = CVXCatFile(0, task.name, task.folder);
   data.Width = image.info.width;
@@ -163,31 +198,34 @@ Importer::Outcome Importer::Import_(Task& task) {
     Fail_(task, "no pixels");
     return Outcome::kSkipped;
   }
-  if (unsigned rc = db_->engine().AddFile(task.record, bitmap, crc); rc != VX_OK) {
+  const unsigned rc =
+      Timed_(kLibrary, [&] { return db_->engine().AddFile(task.record, bitmap, crc); });
+  if (rc != VX_OK) {
     Fail_(task, "cannot add the file (error " + std::to_string(rc) + ")");
     return Outcome::kSkipped;
   }
   std::string error;
-  if (!StoreDependents_(task.record.Oid(), image, meta, &error)) Fail_(task, error);
+  if (!Timed_(kLibrary,
+              [&] { return StoreDependents_(task.record.Oid(), thumbnail, meta, &error); })) {
+    Fail_(task, error);
+  }
   return task.exists ? Outcome::kUpdated : Outcome::kImported;
 }
 
-bool Importer::StoreDependents_(uint32_t oid, const vxhost::DecodedImage& image,
+vxhost::HostStatus Importer::Thumbnail_(const vxhost::DecodedImage& image,
+                                        vxhost::EncodedJpeg* jpeg) const {
+  const SVXThumbInfoNew& info = thumbInfo_;
+  return vxhost::EncodeJpegThumbnail(image.pixels.data(), image.width, image.height,
+                                     std::max(info.Width, 16u), std::max(info.Height, 16u),
+                                     info.Quality ? static_cast<int>(info.Quality) : 85, jpeg);
+}
+
+bool Importer::StoreDependents_(uint32_t oid, const vxhost::EncodedJpeg& jpeg,
                                 const vxhost::ImageMetadata& meta, std::string* error) {
   CVXEngine& engine = db_->engine();
-  const SVXThumbInfoNew info = engine.GetThumbInfo();
-  vxhost::EncodedJpeg jpeg;
-  vxhost::HostStatus s =
-      vxhost::EncodeJpegThumbnail(image.pixels.data(), image.width, image.height,
-                                  std::max(info.Width, 16u), std::max(info.Height, 16u),
-                                  info.Quality ? static_cast<int>(info.Quality) : 85, &jpeg);
-  if (!s.ok()) {
-    *error = "thumbnail: " + s.ToString();
-    return false;
-  }
   CVXThumb thumb;
-  thumb.Create(jpeg.width, jpeg.height, vxhost::kFormatJpeg, static_cast<uint32_t>(jpeg.bytes.size()),
-               jpeg.bytes.data());
+  thumb.Create(jpeg.width, jpeg.height, vxhost::kFormatJpeg,
+               static_cast<uint32_t>(jpeg.bytes.size()), jpeg.bytes.data());
   unsigned rc = engine.AddThumb(oid, thumb);
   if (rc == VX_OK) rc = engine.SetImageProperties(oid, PropertyRow_(meta));
   SXMPRecord xmp;
@@ -212,8 +250,8 @@ std::vector<CVXProperty> Importer::PropertyRow_(const vxhost::ImageMetadata& met
       {"Artist", Text(meta.artist)},
       {"Copyright", Text(meta.copyright)},
       {"Title", Text(meta.title)},
-      {"Description", meta.description.empty() ? CVXProperty()
-                                               : CVXProperty::MakeLongText(meta.description)},
+      {"Description",
+       meta.description.empty() ? CVXProperty() : CVXProperty::MakeLongText(meta.description)},
       {"ExposureTime", Positive(meta.exposureTime)},
       {"Exposure", Text(meta.exposureText)},
       {"Aperture", Positive(meta.fNumber)},

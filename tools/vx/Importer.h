@@ -23,11 +23,23 @@ struct ImportOptions {
   bool showProgress = true;
 };
 
+// Where an import's time went, in seconds. The stages are summed over the workers, so with
+// several workers they add up to more than `wall`.
+struct ImportTimes {
+  double wall = 0;       // the whole run, walk included
+  double crc = 0;        // reading files for their CRC-32
+  double decode = 0;     // libvips: decoding and shrinking
+  double metadata = 0;   // exiv2
+  double thumbnail = 0;  // encoding the JPEG thumbnails
+  double library = 0;    // inside vxcore3: AddFile, AddThumb, properties, XMP, full text
+};
+
 struct ImportCounts {
   uint64_t imported = 0;  // new files
   uint64_t updated = 0;   // files whose size, date or content changed
   uint64_t unchanged = 0;
   uint64_t skipped = 0;  // unreadable, corrupt or not an image
+  ImportTimes times;
 };
 
 // Brings folder trees into the database: folders first (on the caller's thread, parents before
@@ -56,14 +68,21 @@ class Importer {
     CVXCatFile record;
   };
   enum class Outcome { kImported, kUpdated, kUnchanged, kSkipped };
+  enum Stage { kCrc, kDecode, kMetadata, kThumbnail, kLibrary, kStages };
 
   void Collect_(const vxhost::WalkDirectory& dir);
   uint32_t AddFolder_(const vxhost::WalkDirectory& dir);
+  // Takes tasks until none is left; `progress` may be null.
   void Work_(vxhost::Progress* progress);
   Outcome Import_(Task& task);
+  // The JPEG thumbnail the database's settings ask for.
+  vxhost::HostStatus Thumbnail_(const vxhost::DecodedImage& image, vxhost::EncodedJpeg* jpeg) const;
   // Stores what follows the catalog record: thumbnail, properties, XMP and full text.
-  bool StoreDependents_(uint32_t oid, const vxhost::DecodedImage& image,
+  bool StoreDependents_(uint32_t oid, const vxhost::EncodedJpeg& thumbnail,
                         const vxhost::ImageMetadata& meta, std::string* error);
+  // Runs `step` and adds its duration to the stage's total; returns what `step` returns.
+  template <typename Step>
+  auto Timed_(Stage stage, Step step);
   std::vector<CVXProperty> PropertyRow_(const vxhost::ImageMetadata& meta) const;
   void Fail_(const Task& task, const std::string& reason);
 
@@ -71,10 +90,12 @@ class Importer {
   CVXTable table_;
   ImportOptions options_;
   vxhost::ImageDecoder decoder_;
+  SVXThumbInfoNew thumbInfo_;                // the database's, read once before the workers start
   std::map<std::string, uint32_t> folders_;  // canonical path -> OID
   std::vector<Task> tasks_;
   std::atomic<size_t> next_{0};
   std::atomic<uint64_t> counts_[4] = {};  // by Outcome
+  std::atomic<int64_t> nanos_[kStages] = {};
   mutable std::mutex problemsMutex_;
   std::vector<std::string> problems_;
 };

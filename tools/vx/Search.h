@@ -12,7 +12,7 @@ enum class MatchMethod { kQuick, kFuzzy, kHistogram, kDuplicates };
 
 struct SearchOptions {
   MatchMethod method = MatchMethod::kQuick;
-  bool rotate = false;      // also try the image turned by 90, 180 and 270 degrees
+  bool rotate = false;       // also try the image turned by 90, 180 and 270 degrees
   uint32_t maxResults = 20;  // per original
   bool hasMinScore = false;  // without it the hits are only ranked
   double minScore = 0;
@@ -48,8 +48,11 @@ class Search {
   static std::vector<std::vector<uint32_t>> Group(const std::vector<SearchPair>& pairs);
   static bool ParseMethod(const std::string& name, MatchMethod* method);
   static const char* MethodName(MatchMethod method);
-  // The score above which `vx dupes` calls two files near-duplicates.
-  static double DupeThreshold(MatchMethod method);
+  // The score from which `vx dupes` calls two files near-duplicates.
+  static double DupeThreshold(MatchMethod method, bool rotate);
+  // The method `vx dupes` uses unless told: the colour histogram, which on the demo collection
+  // finds turned, cropped and brightened copies without false pairs.
+  static constexpr MatchMethod kDupeMethod = MatchMethod::kHistogram;
 
  private:
   CVXSelector MakeSelector_(const SearchOptions& options) const;

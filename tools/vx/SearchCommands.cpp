@@ -22,7 +22,9 @@ std::vector<uint8_t> ThumbnailOfFile(Database& db, const std::string& path) {
   vxhost::DecodedImage image;
   vxhost::EncodedJpeg jpeg;
   const SVXThumbInfoNew info = db.engine().GetThumbInfo();
-  if (!vxhost::ImageDecoder().Decode(path, &image).ok() ||
+  vxhost::DecodeOptions options;
+  options.maxSide = db.DecodeSide();
+  if (!vxhost::ImageDecoder(options).Decode(path, &image).ok() ||
       !vxhost::EncodeJpegThumbnail(image.pixels.data(), image.width, image.height, info.Width,
                                    info.Height, static_cast<int>(info.Quality), &jpeg)
            .ok()) {
@@ -37,6 +39,7 @@ vxhost::ReportItem Item(Database& db, uint32_t oid, const std::string& score) {
 
 bool WriteHtml(const std::string& path, const std::string& title,
                const std::vector<vxhost::ReportGroup>& groups) {
+  std::fflush(stdout);  // the listing comes before the line that names the report
   std::ofstream out(path, std::ios::binary | std::ios::trunc);
   if (out) {
     vxhost::HtmlReport report(out, title);
@@ -61,7 +64,8 @@ void PrintHits(Database& db, const std::string& query, const SearchOptions& opti
     return;
   }
   vxhost::JsonWriter w(std::cout);
-  w.BeginObject().Key("query").String(query).Key("method").String(Search::MethodName(options.method));
+  w.BeginObject().Key("query").String(query).Key("method").String(
+      Search::MethodName(options.method));
   w.Key("results").BeginArray();
   for (const SearchHit& hit : hits) {
     w.BeginObject().Key("score").Double(hit.score).Key("file");
@@ -130,10 +134,12 @@ int SimilarCommand(const std::string& path, const std::string& image, const Sear
   vxhost::ReportGroup original{"Query", {}};
   original.items.push_back(
       {query, oid ? db.Thumbnail(oid) : ThumbnailOfFile(db, external), std::string()});
-  vxhost::ReportGroup similar{"Similar images (" + std::string(Search::MethodName(options.method)) + ")", {}};
-  for (const SearchHit& hit : hits) similar.items.push_back(Item(db, hit.oid, ScoreText(hit.score)));
+  vxhost::ReportGroup similar{
+      "Similar images (" + std::string(Search::MethodName(options.method)) + ")", {}};
+  for (const SearchHit& hit : hits)
+    similar.items.push_back(Item(db, hit.oid, ScoreText(hit.score)));
   return WriteHtml(output.html, "Similar to " + query, {original, similar}) ? kExitOk
-                                                                             : kExitFailure;
+                                                                            : kExitFailure;
 }
 
 int DupesCommand(const std::string& path, const SearchOptions& options,

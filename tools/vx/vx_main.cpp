@@ -24,10 +24,13 @@ struct SearchArgs {
 
 void AddSearchOptions(CLI::App* app, SearchArgs* args, bool withMax) {
   app->add_option("--method", args->method, "quick, fuzzy, histogram or duplicates")
+      ->capture_default_str()
       ->check(CLI::IsMember({"quick", "fuzzy", "histogram", "duplicates"}));
   app->add_flag("--rotate", args->rotate, "also match the image turned by 90, 180, 270 degrees");
-  if (withMax) app->add_option("--max", args->max, "most hits to list")->check(CLI::Range(1, 32000));
-  app->add_option("--min-score", args->minScore, "lowest score (0 to 100) to list")
+  if (withMax)
+    app->add_option("--max", args->max, "most hits to list")->check(CLI::Range(1, 32000));
+  app->add_option("--min-score", args->minScore,
+                  "lowest score (0 to 100); for dupes the method's tuned cut by default")
       ->check(CLI::Range(0.0, 100.0));
   app->add_flag("--json", args->json, "print JSON");
   app->add_option("--html", args->html, "write an HTML report with thumbnails to this file");
@@ -48,7 +51,8 @@ vx::SearchOptions ToSearchOptions(const SearchArgs& args) {
 int main(int argc, char** argv) {
   CLI::App app{"vx: an image database on the command line"};
   app.require_subcommand(1);
-  app.footer("Exit codes: 0 success, 1 failure, 2 usage error, 3 file, folder or category unknown.");
+  app.footer(
+      "Exit codes: 0 success, 1 failure, 2 usage error, 3 file, folder or category unknown.");
   std::string db;
   int result = vx::kExitOk;
 
@@ -56,22 +60,25 @@ int main(int argc, char** argv) {
   uint32_t thumbSide = 256, thumbQuality = 85;
   bool force = false;
   create->add_option("DB", db, "database file (e.g. photos.vxm)")->required();
-  create->add_option("--thumb-size", thumbSide, "longest side of thumbnails")->check(CLI::Range(40, 1024));
-  create->add_option("--thumb-quality", thumbQuality, "JPEG quality of thumbnails")->check(CLI::Range(1, 100));
+  create->add_option("--thumb-size", thumbSide, "longest side of thumbnails")
+      ->check(CLI::Range(40, 1024));
+  create->add_option("--thumb-quality", thumbQuality, "JPEG quality of thumbnails")
+      ->check(CLI::Range(1, 100));
   create->add_flag("--force", force, "replace an existing database");
   create->callback([&] { result = vx::CreateCommand(db, thumbSide, thumbQuality, force); });
 
-  auto* import = app.add_subcommand("import", "add or update the images of folder trees");
+  auto* importCommand = app.add_subcommand("import", "add or update the images of folder trees");
   std::vector<std::string> dirs;
   vx::ImportOptions importOptions;
   bool importJson = false, plain = false, quiet = false;
-  import->add_option("DB", db, "database file")->required();
-  import->add_option("DIR", dirs, "folders to walk")->required();
-  import->add_option("-j,--jobs", importOptions.threads, "decoding threads (default: all cores)");
-  import->add_flag("--plain", plain, "plain progress lines even on a terminal");
-  import->add_flag("-q,--quiet", quiet, "no progress");
-  import->add_flag("--json", importJson, "print the summary as JSON");
-  import->callback([&] {
+  importCommand->add_option("DB", db, "database file")->required();
+  importCommand->add_option("DIR", dirs, "folders to walk")->required();
+  importCommand->add_option("-j,--jobs", importOptions.threads,
+                            "decoding threads (default: all cores)");
+  importCommand->add_flag("--plain", plain, "plain progress lines even on a terminal");
+  importCommand->add_flag("-q,--quiet", quiet, "no progress");
+  importCommand->add_flag("--json", importJson, "print the summary as JSON");
+  importCommand->callback([&] {
     if (plain) importOptions.progress = vxhost::Progress::Mode::kPlain;
     importOptions.showProgress = !quiet;
     result = vx::ImportCommand(db, dirs, importOptions, importJson);
@@ -91,13 +98,16 @@ int main(int argc, char** argv) {
 
   auto* dupes = app.add_subcommand("dupes", "list groups of near-duplicates, one group a line");
   SearchArgs dupesArgs;
+  dupesArgs.method = vx::Search::MethodName(vx::Search::kDupeMethod);
   dupes->add_option("DB", db, "database file")->required();
   AddSearchOptions(dupes, &dupesArgs, false);
   dupes->callback([&] {
     vx::SearchOptions options = ToSearchOptions(dupesArgs);
     options.maxResults = 10;
     options.hasMinScore = true;
-    if (dupesArgs.minScore < 0) options.minScore = vx::Search::DupeThreshold(options.method);
+    if (dupesArgs.minScore < 0) {
+      options.minScore = vx::Search::DupeThreshold(options.method, options.rotate);
+    }
     result = vx::DupesCommand(db, options, {dupesArgs.json, dupesArgs.html});
   });
 
@@ -138,7 +148,7 @@ int main(int argc, char** argv) {
   auto* form = cat->add_subcommand("formula", "set a category's formula");
   form->add_option("DB", db, "database file")->required();
   form->add_option("NAME", name, "full name of the category")->required();
-  form->add_option("FORMULA", formula, "e.g. '\"Trips\" AND NOT \"Family\"'")->required();
+  form->add_option("FORMULA", formula, "e.g. '\"Trips\" OR \"Alps\" NOT \"Family\"'")->required();
   form->callback([&] { result = vx::CategoryFormulaCommand(db, name, formula); });
   auto* assign = cat->add_subcommand("assign", "put files into a category by hand");
   assign->add_option("DB", db, "database file")->required();
