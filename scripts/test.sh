@@ -34,7 +34,7 @@ done
 echo "== clang ThreadSanitizer build of the threaded code and its tests"
 CC=clang CXX=clang++ cmake -G Ninja -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo \
   -DVX_SANITIZE=thread >/dev/null
-threaded_tests=(vxlib/vxlib_test interfaces/vxsq/vxsq_test core/engine/engine_test
+threaded_tests=(vxlib/vxlib_test interfaces/vxsq/vxsq_test core/engine/engine_test core/catalog/catalog_test
                 core/selection/selection_test core/selection/selengine_test)
 ninja -C build/tsan -j"$jobs" "${threaded_tests[@]##*/}"
 for t in "${threaded_tests[@]}"; do

@@ -5,7 +5,9 @@
 #include <utility>
 #include <vector>
 
+#include "VXException.h"
 #include "VXFile.h"
+#include "VXResult.h"
 #include "xstring.h"
 
 namespace {
@@ -111,6 +113,26 @@ void CVXCatFile::Read(CVXFile& file) {
   Block(d, ByteCursor{block});
   Oid() = oid;
   data_ = std::move(d);
+}
+
+CVXCatFile::CVXCatFile(const uint8_t*& at, const uint8_t* end) {
+  const uint8_t* next = at;
+  auto take = [&](size_t bytes) {
+    if (static_cast<size_t>(end - next) < bytes) VX_THROW(VX_NOT_FOUND);
+    const uint8_t* start = next;
+    next += bytes;
+    return start;
+  };
+  // Both versions are ignored, as in Read.
+  const uint8_t* head = take(8 + sizeof(uint32_t));
+  uint32_t length = 0;
+  std::memcpy(&Oid(), head + 2, sizeof(uint32_t));
+  std::memcpy(&length, head + 8, sizeof length);
+  const uint8_t* name = take(length);
+  const uint8_t* block = take(kBlockBytes);
+  data_.Name.assign(reinterpret_cast<const char*>(name), length);
+  Block(data_, ByteCursor{block});
+  at = next;
 }
 
 CVXFile& operator<<(CVXFile& file, const CVXCatFile& catFile) {

@@ -39,10 +39,14 @@ class CVXCatFile : public CVXDBObject {
   };
   static constexpr uint32_t kBlockBytes = 66;
 
-  // Every constructor but the copy stamps Processed and FileTime with the current time.
+  // The constructors that make a new file (all but the copy and the reading one) stamp
+  // Processed and FileTime with the current time.
   CVXCatFile();
   CVXCatFile(uint32_t oid, const std::string& name, uint32_t folderOid);
   CVXCatFile(uint32_t oid, const char* name, uint32_t folderOid);
+  // Reads a file record (as Read does) straight from the bytes at `at`, up to `end`, and moves
+  // `at` behind it: bulk loads build their map entries with it.
+  CVXCatFile(const uint8_t*& at, const uint8_t* end);
   CVXCatFile(const CVXCatFile&) = default;
   CVXCatFile& operator=(const CVXCatFile&) = default;
   ~CVXCatFile() override = default;

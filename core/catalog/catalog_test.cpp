@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
+#include <map>
 #include <vector>
 
 #include "QRLBlobDB.h"
@@ -8,6 +10,7 @@
 #include "VXEngine.h"
 #include "VXException.h"
 #include "VXFolder.h"
+#include "VXMemFile.h"
 #include "VXResult.h"
 #include "VXURI.h"
 #include "vxcatalog.h"
@@ -39,6 +42,16 @@ class CatalogTest : public ::testing::Test {
     std::vector<uint8_t> bytes(size);
     EXPECT_EQ(db.Get(sel, bytes.data(), size), VX_OK);
     return bytes;
+  }
+
+  // Empty when the maps are equal, else where they first differ.
+  template <typename Map>
+  static std::string Differs(const Map& got, const Map& want) {
+    auto [g, w] = std::mismatch(got.begin(), got.end(), want.begin(), want.end());
+    if (g == got.end() && w == want.end()) return "";
+    return std::to_string(got.size()) + " entries, want " + std::to_string(want.size()) +
+           "; first difference at " + (g != got.end() ? std::to_string(g->first) : "the end") +
+           " / " + (w != want.end() ? std::to_string(w->first) : "the end");
   }
 
   unsigned OpenCode(bool readOnly = false) {
@@ -217,6 +230,126 @@ TEST_F(CatalogTest, OpenSendsLoadMessagesToTheEngine) {
   seen.messages.clear();
   engine.Catalog().Notify(5003, 1, 0, nullptr);
   EXPECT_TRUE(seen.messages.empty()) << "the callback outlived Open";
+}
+
+// Bulk loads read file records straight from bytes: every cut short record fails as the stream
+// reader fails, and a whole one reads the same and ends where the next begins.
+TEST(CatFileBytes, ReadLikeTheStream) {
+  CVXCatFile file(77, "name.jpg", 5);
+  file.Properties().CRC = 0xDEADBEEF;
+  file.Properties().Reserved4[18] = 9;
+  CVXMemFile mem;
+  mem << file;
+  std::vector<uint8_t> bytes(mem.GetBuffer(), mem.GetBuffer() + mem.GetFileSize());
+  auto codeOf = [](auto read) {
+    try {
+      read();
+    } catch (CVXException* e) {
+      unsigned code = e->GetCode();
+      delete e;
+      return code;
+    }
+    return unsigned{VX_OK};
+  };
+  for (size_t size = 0; size < bytes.size(); ++size) {
+    CVXMemFile cut(bytes.data(), size);
+    CVXCatFile streamed;
+    EXPECT_EQ(codeOf([&] { cut >> streamed; }), VX_NOT_FOUND) << size;
+    const uint8_t* at = bytes.data();
+    EXPECT_EQ(codeOf([&] { CVXCatFile read(at, bytes.data() + size); }), VX_NOT_FOUND) << size;
+  }
+  bytes.push_back(0xAB);  // the next record's first byte
+  const uint8_t* at = bytes.data();
+  CVXCatFile read(at, bytes.data() + bytes.size());
+  EXPECT_EQ(at, bytes.data() + bytes.size() - 1);
+  CVXMemFile again;
+  again << read;
+  EXPECT_TRUE(std::equal(bytes.begin(), bytes.end() - 1, again.GetBuffer()));
+  EXPECT_EQ(again.GetFileSize(), bytes.size() - 1);
+}
+
+// A catalog of more than two batches of files loads them as stored, with a progress message per
+// batch; a record that does not read in the middle of the second batch ends the load there,
+// keeping every file before it and sending the messages of the batches before.
+TEST_F(CatalogTest, FilesLoadInBatchesAndStopAtABadRecord) {
+  SVXCreateInfo info;
+  info.Name = dir_ / "db.vxm";  // its catalog is Path()
+  {
+    CVXEngine engine;
+    ASSERT_EQ(engine.Create(info), VX_OK);
+    ASSERT_EQ(engine.Close(), VX_OK);
+  }
+  constexpr uint32_t kFiles = 12001;
+  std::map<uint32_t, std::vector<uint8_t>> stored;  // OID -> record
+  auto oidOf = [](uint32_t i) { return 2 * i + 1; };
+  WithStore([&](CQRLBlobDB& db) {
+    for (uint32_t i = 0; i < kFiles; ++i) {
+      // A long name ends the first batch and an empty one begins the second.
+      std::string name = i == 4999   ? std::string(5000, 'x')
+                         : i == 5000 ? std::string()
+                                     : "IMG_" + std::to_string(i) + ".JPG";
+      CVXCatFile file(oidOf(i), name, i % 97 + 1);
+      CVXCatFile::SData& d = file.Properties();
+      d.Width = i;
+      d.CRC = i * 2654435761u;
+      d.Flags = static_cast<uint16_t>(i);
+      d.VersionTag = static_cast<uint8_t>(i);
+      d.Reserved4[18] = static_cast<uint8_t>(i % 251);
+      CVXMemFile mem;
+      mem << file;
+      stored[oidOf(i)].assign(mem.GetBuffer(), mem.GetBuffer() + mem.GetFileSize());
+      ASSERT_EQ(db.Set(Sel(3, oidOf(i)), mem.GetBuffer(), static_cast<unsigned>(mem.GetFileSize())),
+                VX_OK);
+    }
+  });
+  using Messages = std::vector<std::pair<unsigned, unsigned long>>;
+  // The messages up to the end of the file stage, and the code of an engine open.
+  auto openEngine = [&](Messages& files) {
+    Messages seen;
+    auto cb = [](ECBMessage m, void* user, unsigned long a, unsigned long, const char*) {
+      static_cast<Messages*>(user)->emplace_back(m, a);
+    };
+    CVXEngine engine;
+    unsigned rc = engine.Open(info, cb, &seen);
+    engine.Close();
+    auto end = std::find(seen.begin(), seen.end(), std::pair<unsigned, unsigned long>(5004, 0));
+    files.assign(seen.begin(), end == seen.end() ? end : end + 1);
+    return rc;
+  };
+  // Compared record by record: a difference names the first OID that differs.
+  auto loaded = [&] {
+    std::map<uint32_t, std::vector<uint8_t>> out;
+    for (const auto& [oid, file] : Catalog().Files()) {
+      CVXMemFile mem;
+      mem << file;
+      out[oid].assign(mem.GetBuffer(), mem.GetBuffer() + mem.GetFileSize());
+    }
+    return out;
+  };
+
+  Messages files;
+  ASSERT_EQ(openEngine(files), VX_OK);
+  EXPECT_EQ(
+      files,
+      (Messages{
+          {5000, 0}, {5003, 0}, {5003, 41}, {5003, 83}, {5003, 100}, {5003, 100}, {5004, 0}}));
+  ASSERT_EQ(OpenCode(true), VX_OK);
+  EXPECT_EQ(Differs(loaded(), stored), "");
+  Catalog().Close();
+
+  const uint32_t bad = oidOf(7002);
+  std::vector<uint8_t> record = stored[bad];
+  std::fill(record.begin() + 8, record.begin() + 12, 0xFF);  // a name longer than the batch
+  WithStore([&](CQRLBlobDB& db) {
+    ASSERT_EQ(db.Set(Sel(3, bad), record.data(), static_cast<unsigned>(record.size())), VX_OK);
+  });
+  EXPECT_EQ(openEngine(files), VX_NOT_FOUND);
+  EXPECT_EQ(files, (Messages{{5000, 0}, {5003, 0}, {5003, 41}, {5003, 100}, {5004, 0}}));
+  log_.ClearCaptured();
+  EXPECT_EQ(OpenCode(true), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Loading files"));
+  stored.erase(stored.find(bad), stored.end());
+  EXPECT_EQ(Differs(loaded(), stored), "");
 }
 
 }  // namespace

@@ -262,12 +262,10 @@ class CVXCatalog : public CVXBase {
   static uint32_t HighestOid_(const std::map<uint32_t, T>& map, uint32_t ignore);
   template <typename T>
   unsigned LoadRecord_(ERecordType type, uint32_t oid, T& object);
-  // Reads every record of `type` one at a time into `loaded`, with progress messages; stops at
-  // the first failure.
+  // Reads every record of `type` into `loaded`, with progress messages; stops at the first
+  // failure.
   template <typename T>
-  unsigned LoadEach_(ERecordType type, std::map<uint32_t, T>& loaded, bool sequential);
-  // Reads the records of oids[at, end) one behind the other out of `file` into the file map.
-  unsigned DecodeFiles_(CVXMemFile& file, const std::vector<uint32_t>& oids, size_t at, size_t end);
+  unsigned LoadEach_(ERecordType type, std::map<uint32_t, T>& loaded);
   uint32_t NextOid_(uint32_t SVXCatalogHeader::*field);
 
   CVXEngine* engine_ = nullptr;  // not owned

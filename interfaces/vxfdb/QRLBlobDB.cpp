@@ -136,8 +136,9 @@ struct CQRLBlobDB::Impl {
     std::vector<std::pair<uint32_t, unsigned>> sizes;
   } listing;
   std::string lastError;
-  // Reads select (id, data) or (id, length(data)), by one key or by a range of keys.
-  CSQLiteStatement get, size, getRange, sizeRange, set, remove, begin, commit;
+  // Reads select (id, data) or (id, length(data)), by one key or by a range of keys; getFrom
+  // walks on from a key to wherever the caller stops.
+  CSQLiteStatement get, size, getRange, sizeRange, getFrom, set, remove, begin, commit;
 
   unsigned Fail(unsigned code, const char* op, const std::string& what);
   unsigned SqlFail(const char* op, const std::string& what);
@@ -286,6 +287,7 @@ bool CQRLBlobDB::Impl::PrepareStatements() {
          prepare(getRange, "SELECT id, data FROM blobdb_records WHERE id BETWEEN ?1 AND ?2") &&
          prepare(sizeRange,
                  "SELECT id, length(data) FROM blobdb_records WHERE id BETWEEN ?1 AND ?2") &&
+         prepare(getFrom, "SELECT id, data FROM blobdb_records WHERE id >= ?1") &&
          prepare(set, "INSERT OR REPLACE INTO blobdb_records(id, data) VALUES(?1, ?2)") &&
          prepare(remove, "DELETE FROM blobdb_records WHERE id=?1") && prepare(begin, "BEGIN") &&
          prepare(commit, "COMMIT");
@@ -294,7 +296,8 @@ bool CQRLBlobDB::Impl::PrepareStatements() {
 // Closes the connection. Without `force` it fails (and keeps the connection whole) while
 // statements prepared by others on Handle() are still alive.
 bool CQRLBlobDB::Impl::Disconnect(bool force) {
-  for (CSQLiteStatement* st : {&get, &size, &getRange, &sizeRange, &set, &remove, &begin, &commit})
+  for (CSQLiteStatement* st :
+       {&get, &size, &getRange, &sizeRange, &getFrom, &set, &remove, &begin, &commit})
     st->Finalize();
   if (!db) return true;
   if (sqlite3_close(db) != SQLITE_OK) {
@@ -708,6 +711,53 @@ unsigned CQRLBlobDB::GetOids(uint16_t type, std::vector<uint32_t>& oids, bool so
   oids.reserve(listing.sizes.size());
   for (const auto& entry : listing.sizes) oids.push_back(entry.first);
   return VX_OK;
+}
+
+// The listing scan already walks every record of the type, so it hands the bytes on as it
+// goes: a bulk load reads the type once instead of once to list it and once more in batches.
+unsigned CQRLBlobDB::GetAll(uint16_t type, size_t runLength, const RunSink& sink) {
+  Impl& s = *impl_;
+  // It lists the type, and fails and logs as GetOids does.
+  if (!s.db) return s.Fail(VX_NOT_FOUND, "GetOids", "store not open");
+  runLength = std::max<size_t>(runLength, 1);
+  std::vector<uint32_t> oids;
+  std::vector<uint8_t> bytes;
+  oids.reserve(runLength);
+  // Open-ended, the walk tests one key a row instead of two; it stops at the next type.
+  CSQLiteStatement& st = s.getFrom;
+  st.Bind(1, FirstKey(type));
+  // Also when the sink throws: a statement left stepping would hold the read transaction.
+  struct SReset {
+    CSQLiteStatement& st;
+    ~SReset() { st.Reset(); }
+  } reset{st};
+  unsigned result = VX_OK;
+  int rc = SQLITE_DONE;
+  while (result == VX_OK && (rc = st.Step()) == SQLITE_ROW) {
+    int64_t key = st.Int64(0);
+    if (key > LastKey(type)) {
+      rc = SQLITE_DONE;
+      break;
+    }
+    const auto* data = static_cast<const uint8_t*>(st.Blob(1));
+    size_t size = static_cast<size_t>(st.Bytes(1));
+    if (!data && size)
+      return s.Fail(VX_NOT_FOUND, "GetOids", std::to_string(type) + ": out of memory");
+    oids.push_back(static_cast<uint32_t>(key));
+    bytes.insert(bytes.end(), data, data + size);
+    if (oids.size() == runLength) {
+      result = sink(oids, bytes);
+      oids.clear();
+      bytes.clear();
+    }
+  }
+  if (result != VX_OK) return result;
+  if (rc != SQLITE_DONE) {
+    s.lastError = sqlite3_errmsg(s.db);
+    return s.SqlFail("GetOids", std::to_string(type));
+  }
+  st.Reset();  // done with the store before the last run goes out
+  return oids.empty() ? VX_OK : sink(oids, bytes);
 }
 
 unsigned CQRLBlobDB::GetNumberOfRecords(uint16_t type, unsigned& count) {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <iosfwd>
 #include <memory>
 #include <string>
@@ -107,6 +108,16 @@ class CQRLBlobDB : public CVXBase {
   // answer GetSize of batches of that type until the next change on the connection, so that
   // listing a type and then reading it in batches scans it twice, not three times.
   unsigned GetOids(uint16_t type, std::vector<uint32_t>& oids, bool sorted);
+  // Receives runs of GetAll: OIDs and the records' bytes one behind the other, as a batch Get
+  // lays them out. It may take the vectors' content (swapping in other vectors, which are
+  // cleared before they are filled); a result other than 10001 ends the walk with that result.
+  using RunSink = std::function<unsigned(std::vector<uint32_t>& oids, std::vector<uint8_t>& bytes)>;
+  // All records of a type in one walk, in rising OID order, handed to `sink` in runs of
+  // `runLength` (the last run may be shorter; none when the type is empty): the listing of
+  // GetOids and the reads of all its batches at once. Fails and logs as GetOids does. The walk
+  // may run on another thread than the owner's, as long as nothing else uses the store
+  // meanwhile.
+  unsigned GetAll(uint16_t type, size_t runLength, const RunSink& sink);
   unsigned GetNumberOfRecords(uint16_t type, unsigned& count);
   // Reorders `oids` into the order in which their records lie in the file, which is rising OID
   // order within a type (the key is (type, OID)); after Optimize that is also page order.

@@ -413,3 +413,51 @@ TEST_F(BlobDBTest, OptimizeCompactsAndKeepsRecords) {
   ASSERT_EQ(db.Open(path_, false), VX_OK);
   EXPECT_TRUE(Intact(db, {2, 1}, 1601) && Intact(db, {2, 3000}, 1601));
 }
+
+// One walk hands over what GetOids and batch Gets of the same runs would give, and no record of
+// a neighbouring type.
+TEST_F(BlobDBTest, GetAllWalksATypeInRuns) {
+  CQRLBlobDB db;
+  auto collect = [&](uint16_t type, size_t runLength, std::vector<std::vector<uint32_t>>& runs,
+                     std::string& bytes) {
+    return db.GetAll(type, runLength, [&](std::vector<uint32_t>& oids, std::vector<uint8_t>& b) {
+      runs.push_back(oids);
+      bytes.append(b.begin(), b.end());
+      // The sink may take the buffers and give others back: the walk empties them first.
+      std::vector<uint32_t> otherOids = {99};
+      std::vector<uint8_t> otherBytes(3, 0xEE);
+      oids.swap(otherOids);
+      b.swap(otherBytes);
+      return unsigned{VX_OK};
+    });
+  };
+  std::vector<std::vector<uint32_t>> runs;
+  std::string bytes;
+  EXPECT_EQ(collect(2, 3, runs, bytes), VX_NOT_FOUND);  // closed
+  ASSERT_EQ(db.Create(path_, 0), VX_OK);
+  ASSERT_EQ(Put(db, {1, 0xFFFFFFFF}, 4), VX_OK);
+  ASSERT_EQ(Put(db, {3, 1}, 4), VX_OK);
+  std::vector<Sel> sels;
+  for (uint32_t oid : {40u, 2u, 9u, 10u, 11u, 500u, 7u, 0xFFFFFFFFu}) {
+    ASSERT_EQ(Put(db, {2, oid}, oid % 700), VX_OK);
+  }
+  std::vector<uint32_t> listed;
+  ASSERT_EQ(db.GetOids(2, listed, true), VX_OK);
+  for (uint32_t oid : listed) sels.push_back({2, oid});
+  unsigned total = 0;
+  ASSERT_EQ(db.GetSize(sels, total), VX_OK);
+  std::string batch(total, '\0');
+  ASSERT_EQ(db.Get(sels, batch.data()), VX_OK);
+
+  ASSERT_EQ(collect(2, 3, runs, bytes), VX_OK);
+  std::vector<std::vector<uint32_t>> want = {{2, 7, 9}, {10, 11, 40}, {500, 0xFFFFFFFF}};
+  EXPECT_EQ(runs, want);
+  EXPECT_EQ(bytes, batch);
+
+  runs.clear();
+  EXPECT_EQ(collect(4, 3, runs, bytes), VX_OK);
+  EXPECT_TRUE(runs.empty());
+  int calls = 0;
+  EXPECT_EQ(db.GetAll(2, 2, [&](auto&, auto&) { return ++calls == 2 ? 10123u : VX_OK; }), 10123u);
+  EXPECT_EQ(calls, 2);
+}
