@@ -1,7 +1,8 @@
 // A fixed-seed random sequence of file and folder operations through the engine, after which the
 // catalog and the other stores must agree: every listed file has its shape data and thumbnail,
-// and no store holds data of a file the catalog lacks. The same sequence is also killed at a
-// step, or in the middle of one, and the database reopened.
+// no store holds data of a file the catalog lacks, and no folder lists a file that is not its
+// own. The same sequence is also killed at a step, or in the middle of one, and the database
+// reopened.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/mman.h>
@@ -37,12 +38,40 @@ enum EOp {
   opBadTarget,
 };
 
-// What a step is doing, where a parent process can read it after the child was killed.
+// What a step is doing, where a parent process can read it after the child was killed. The
+// step fills it in before it calls the engine; the lists are plain arrays so that the whole
+// lies in one shared mapping, with room for every file the sequences make.
 struct SProgress {
+  static constexpr uint32_t kMaxRemoved = 8192;
+  static constexpr uint32_t kMaxLists = 4;
+
   int Step = -1;
   int Op = -1;
   uint32_t LastFileOid = 0;  // the catalog's counter before the step
-  uint32_t Oid = 0;          // the file or folder the step removes
+  // Files the step removes: the file or the folder's files it removes, or the file that a move
+  // or copy replaces.
+  uint32_t NumRemoved = 0;
+  uint32_t Removed[kMaxRemoved];
+  // Folders that the step may leave listing a file that is no longer theirs. Moving a file, the
+  // catalog stores the target's list, then the file's record, then the source's list; merging
+  // folders, it stores the records of the source's files before the lists. Cut short, a moved
+  // file can be in both lists, merged files in the source's list alone.
+  uint32_t NumLists = 0;
+  uint32_t Lists[kMaxLists];
+
+  void Begin(int op, uint32_t lastFileOid) {
+    NumRemoved = NumLists = 0;
+    Op = op;
+    LastFileOid = lastFileOid;
+  }
+  void Removes(uint32_t oid) {
+    if (oid != 0 && NumRemoved < kMaxRemoved) Removed[NumRemoved++] = oid;
+  }
+  void Rewrites(uint32_t folder) {
+    if (NumLists < kMaxLists) Lists[NumLists++] = folder;
+  }
+  std::set<uint32_t> RemovedSet() const { return {Removed, Removed + NumRemoved}; }
+  std::set<uint32_t> ListsSet() const { return {Lists, Lists + NumLists}; }
 };
 
 // Draws operations on what the catalog holds now. Each step is one host action: a file added
@@ -60,9 +89,8 @@ class Sequence {
     if (engine_.Catalog().NumberOfFiles() == 0 && op >= opProperties && op <= opRemove) {
       op = opAdd;
     }
-    progress.LastFileOid = engine_.Catalog().Header().LastFileOid;
-    progress.Oid = 0;
-    progress.Op = engine_.Catalog().NumberOfFolders() == 0 ? opAddFolder : op;
+    if (engine_.Catalog().NumberOfFolders() == 0) op = opAddFolder;
+    progress.Begin(op, engine_.Catalog().Header().LastFileOid);
     if (engine_.Catalog().NumberOfFolders() == 0) return AddFolder("c:/root" + Number() + "/");
     switch (op) {
       case opAdd:
@@ -72,19 +100,19 @@ class Sequence {
       case opProperties:
         return Properties(AnyFile());
       case opMove:
-        return Expect(engine_.MoveFile(AnyFile(), AnyFolder(), AnyName(), Coin()));
+        return Move(progress);
       case opCopy:
-        return Copy();
+        return Copy(progress);
       case opRename:
         return Expect(engine_.RenameFile(AnyFile(), AnyName()));
       case opReprocess:
         return Reprocess(AnyFile());
       case opRemove:
-        return Expect(engine_.RemoveFile(progress.Oid = AnyFile()));
+        return Remove(progress);
       case opAddFolder:
         return AddFolder(FolderURI(AnyFolder()) + "d" + Number() + "/");
       case opRenameFolder:
-        return RenameFolder();
+        return RenameFolder(progress);
       case opRemoveFolder:
         return RemoveFolder(progress);
       default:
@@ -122,6 +150,18 @@ class Sequence {
   }
   std::string FolderURI(uint32_t oid) {
     return engine_.Catalog().Folders().at(oid).URI().NoProtocol();
+  }
+  // The file of that name in the folder's list, which a move or copy there replaces.
+  uint32_t InTheWay(uint32_t folder, const std::string& name, uint32_t skip) {
+    const auto& files = engine_.Catalog().Files();
+    for (uint32_t oid : engine_.Catalog().Folders().at(folder).Files()) {
+      auto file = files.find(oid);
+      if (oid != skip && file != files.end() &&
+          CVXCatFile::CompareNames(file->second.Name(), name) == 0) {
+        return oid;
+      }
+    }
+    return 0;
   }
 
   void AddFolder(const std::string& uri) {
@@ -166,9 +206,29 @@ class Sequence {
     }
   }
 
-  void Copy() {
+  void Move(SProgress& progress) {
+    uint32_t oid = AnyFile();
+    uint32_t folder = AnyFolder();
+    std::string name = AnyName();
+    progress.Rewrites(engine_.Catalog().Files().at(oid).Properties().Folder);
+    progress.Rewrites(folder);
+    progress.Removes(InTheWay(folder, name, oid));
+    Expect(engine_.MoveFile(oid, folder, name, Coin()));
+  }
+
+  void Copy(SProgress& progress) {
+    uint32_t oid = AnyFile();
+    uint32_t folder = AnyFolder();
+    std::string name = AnyName();
+    progress.Removes(InTheWay(folder, name, 0));
     unsigned long newOid = 0;
-    Expect(engine_.CopyFile(AnyFile(), AnyFolder(), newOid, AnyName(), Coin()));
+    Expect(engine_.CopyFile(oid, folder, newOid, name, Coin()));
+  }
+
+  void Remove(SProgress& progress) {
+    uint32_t oid = AnyFile();
+    progress.Removes(oid);
+    Expect(engine_.RemoveFile(oid));
   }
 
   void Reprocess(uint32_t oid) {
@@ -179,19 +239,30 @@ class Sequence {
   }
 
   // To a free root, or merged into another folder when neither has sub-folders.
-  void RenameFolder() {
+  void RenameFolder(SProgress& progress) {
     uint32_t from = AnyFolder();
     uint32_t into = AnyFolder();
     const auto& folders = engine_.Catalog().Folders();
     bool merge = Coin() && from != into && folders.at(from).Children().empty() &&
                  folders.at(into).Children().empty();
+    if (merge) progress.Rewrites(from);
     CVXURI uri(merge ? FolderURI(into) : "c:/moved" + Number() + "/", true);
     Expect(engine_.RenameFolder(from, uri, "VOL", "1"));
   }
 
+  // The files are those of the folders' lists, which the engine and the catalog walk.
   void RemoveFolder(SProgress& progress) {
     if (engine_.Catalog().NumberOfFolders() <= 2) return;
-    Expect(engine_.RemoveFolder(progress.Oid = AnyFolder()));
+    uint32_t oid = AnyFolder();
+    const auto& folders = engine_.Catalog().Folders();
+    std::vector<uint32_t> tree{oid};
+    for (size_t i = 0; i < tree.size(); ++i) {
+      auto folder = folders.find(tree[i]);
+      if (folder == folders.end()) continue;
+      for (uint32_t file : folder->second.Files()) progress.Removes(file);
+      tree.insert(tree.end(), folder->second.Children().begin(), folder->second.Children().end());
+    }
+    Expect(engine_.RemoveFolder(oid));
   }
 
   // Operations aimed at what is not there fail and must leave nothing behind.
@@ -210,15 +281,39 @@ class Sequence {
   int counter_ = 0;
 };
 
-// Files that may lack data because the step in flight was cut short.
+// What the step in flight may have left half done because it was cut short.
 struct SExcuses {
   std::set<uint32_t> noData;   // listed, but their removal had begun
   std::set<uint32_t> noThumb;  // added from a bitmap, killed before the thumbnail came
+  std::set<uint32_t> lists;    // folders that may list a file that is no longer theirs
 };
 
-// Checks both directions and returns how many records lie in the stores without a catalog
-// record; those fail the test only when `orphansAllowed` is false.
+// Whether a folder may list the file: it has a record, and the record names the folder.
+bool Owns(const CVXCatalog& catalog, uint32_t folder, uint32_t file) {
+  auto it = catalog.Files().find(file);
+  return it != catalog.Files().end() && it->second.Properties().Folder == folder;
+}
+
+// Folders that list a file that is not their own. Removing such a folder strips the data of
+// that file too, and the catalog then fails on it with the folder's other files still listed.
+// (The other way round is no fault: a folder added again with an empty list keeps none of its
+// files, which stay in the catalog and name it.)
+std::set<uint32_t> FoldersListingOthers(const CVXCatalog& catalog) {
+  std::set<uint32_t> out;
+  for (const auto& [oid, folder] : catalog.Folders()) {
+    for (uint32_t file : folder.Files()) {
+      if (!Owns(catalog, oid, file)) out.insert(oid);
+    }
+  }
+  return out;
+}
+
+// Checks both directions and the folders' lists, and returns how many records lie in the
+// stores without a catalog record; those fail the test only when `orphansAllowed` is false.
 size_t ExpectAgreement(ProbeEngine& engine, const SExcuses& excuses, bool orphansAllowed) {
+  for (uint32_t folder : FoldersListingOthers(engine.Catalog())) {
+    EXPECT_TRUE(excuses.lists.count(folder)) << "folder " << folder << " lists another's file";
+  }
   vxtest::StoreContents c = vxtest::ReadStores(engine);
   const auto& files = engine.Catalog().Files();
   for (const auto& [oid, file] : files) {
@@ -289,27 +384,45 @@ class EngineConsistencyTest : public vxtest::EngineFixture {
   }
 
   // What the step in flight may have left half done, per the order of its store writes.
+  // Removals take the data before the catalog record; a move or copy lets the catalog drop the
+  // file it replaces first, and its data follows.
   SExcuses ExcusesFor(const SProgress& p) {
     SExcuses excuses;
+    excuses.lists = p.ListsSet();
     if (p.Op == opAdd) {
       for (const auto& [oid, file] : engine_.Catalog().Files()) {
         if (oid > p.LastFileOid) excuses.noThumb.insert(oid);
       }
-    } else if (p.Op == opRemove) {
-      excuses.noData.insert(p.Oid);
-    } else if (p.Op == opRemoveFolder) {
-      // The catalog removes files before their folders, so every file still listed lies in a
-      // folder that is still there; climb from it.
-      const auto& folders = engine_.Catalog().Folders();
-      for (const auto& [oid, file] : engine_.Catalog().Files()) {
-        for (uint32_t f = file.Properties().Folder; f != 0 && folders.count(f);
-             f = folders.at(f).ParentFolder()) {
-          if (f == p.Oid) excuses.noData.insert(oid);
-          if (f == p.Oid) break;
-        }
-      }
+    } else if (p.Op == opRemove || p.Op == opRemoveFolder) {
+      excuses.noData = p.RemovedSet();
     }
     return excuses;
+  }
+
+  // Finishes what the step in flight left half done, as later steps would otherwise work on a
+  // half-written catalog. A removal is done again, the stores' misses do not stop it: always
+  // for a removal, which may have taken the data already; for the file a move or copy
+  // replaces, once its folder has let it go. A folder that the step may have left listing
+  // another's file keeps only its own.
+  void FinishStep(const SProgress& p) {
+    const CVXCatalog& catalog = engine_.Catalog();
+    std::set<uint32_t> listed;
+    for (const auto& [oid, folder] : catalog.Folders()) {
+      listed.insert(folder.Files().begin(), folder.Files().end());
+    }
+    bool dataFirst = p.Op == opRemove || p.Op == opRemoveFolder;
+    for (uint32_t oid : p.RemovedSet()) {
+      if (!catalog.IsUniqueFileOID(oid) && (dataFirst || !listed.count(oid))) {
+        EXPECT_EQ(engine_.RemoveFile(oid), VX_OK) << oid;
+      }
+    }
+    std::set<uint32_t> listingOthers = FoldersListingOthers(catalog);
+    for (uint32_t oid : p.ListsSet()) {
+      if (!listingOthers.count(oid)) continue;
+      CVXFolder folder = catalog.Folders().at(oid);
+      std::erase_if(folder.Files(), [&](uint32_t file) { return !Owns(catalog, oid, file); });
+      EXPECT_EQ(engine_.SetFolder(folder), VX_OK) << oid;
+    }
   }
 };
 
@@ -352,13 +465,8 @@ TEST_F(EngineConsistencyTest, KilledInsideAStepOnlyThatStepIsHalfDone) {
     EXPECT_GE(p.Step, 0);
     SExcuses excuses = ExcusesFor(p);
     ExpectAgreement(engine_, excuses, true);
-    // An interrupted removal is finished by removing again: the stores' misses do not stop it.
-    for (uint32_t oid : excuses.noData) {
-      if (!engine_.Catalog().IsUniqueFileOID(oid)) {
-        EXPECT_EQ(engine_.RemoveFile(oid), VX_OK);
-      }
-    }
-    ExpectAgreement(engine_, {{}, excuses.noThumb}, true);
+    FinishStep(p);
+    ExpectAgreement(engine_, {{}, excuses.noThumb, {}}, true);
     // The host gives the new file its thumbnail, as it would have; work goes on, and what the
     // cut step left behind takes nothing from new files.
     for (uint32_t oid : excuses.noThumb) {
