@@ -122,13 +122,21 @@ void BM_RawBatchedRead(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * kCandidates);
 }
 
-// Every file an original against every file, ten best hits each.
+// A selection engine whose scoring threads the benchmark sets.
+class CThreadedSelEngine : public CVXSelEngine {
+ public:
+  using CVXSelEngine::CVXSelEngine;
+  using CVXSelEngine::SetScoringThreads;
+};
+
+// Every file an original against every file, ten best hits each, scored on range(1) threads.
 void BM_FindDuplicates(benchmark::State& state) {
   const uint32_t files = static_cast<uint32_t>(state.range(0));
   auto engine = OpenEngine(Database(files));
   std::vector<SVXFileDescriptor> originals;
   for (uint32_t oid = 1; oid <= files; ++oid) originals.push_back({oid, 0, CVXURI()});
-  CVXSelEngine run(engine.get());
+  CThreadedSelEngine run(engine.get());
+  run.SetScoringThreads(static_cast<unsigned>(state.range(1)));
   run.InitSelection(QuickMatch(10), originals);
   for (auto _ : state) {
     CVXResultSet result;
@@ -142,6 +150,13 @@ void BM_FindDuplicates(benchmark::State& state) {
 
 BENCHMARK(BM_SelectionRun)->Unit(benchmark::kMillisecond)->UseRealTime();
 BENCHMARK(BM_RawBatchedRead)->Unit(benchmark::kMillisecond)->UseRealTime();
-BENCHMARK(BM_FindDuplicates)->Arg(4000)->Arg(20000)->Unit(benchmark::kSecond)->Iterations(1)->UseRealTime();
+BENCHMARK(BM_FindDuplicates)
+    ->Args({4000, 1})
+    ->Args({4000, 2})
+    ->Args({20000, 1})
+    ->Args({20000, 2})
+    ->Unit(benchmark::kSecond)
+    ->Iterations(1)
+    ->UseRealTime();
 
 BENCHMARK_MAIN();

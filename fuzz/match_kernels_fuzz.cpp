@@ -1,7 +1,8 @@
 // Two shape records and a match setting from the input, through every match kernel. Each record
 // lies alone in a heap block of exactly its size, so a read past its 400 cells (a neighbourhood
 // reaching index 420, say) is caught by the address sanitizer. Scores must be a number from 0 to
-// 100 or not a number, and the portable and AVX2 kernels must agree.
+// 100 or not a number, the portable and vector kernels must agree, the plain quick walks (on
+// prepared records too) to the bit.
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -93,6 +94,17 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   RunSet(vxmatch::PortableFuzzyKernels(), vxmatch::Avx2FuzzyKernels(), MatchCSFuzzy, *o, *c, p,
          true);
   CheckScore(MatchDuplicates(*o, *c, p));
+  if (!p.Rotate && !p.Weighted()) {
+    // Whatever the processor runs, and from prepared records, the plain walk gives the
+    // portable result to the bit.
+    const double portable =
+        vxmatch::PortableQuickKernels().Pick(p)(vxmatch::CellBytes(*o), vxmatch::CellBytes(*c), p);
+    for (double other :
+         {MatchCSQuick(*o, *c, p),
+          MatchCSQuickPrepared(PrepareQuick(*o, p.Fast), PrepareQuick(*c, p.Fast), p)}) {
+      Check(other == portable || (std::isnan(other) && std::isnan(portable)));
+    }
+  }
 
   CHist ho, hc;
   ho.Build(o->Info, p.Weighting);

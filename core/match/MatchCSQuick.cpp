@@ -77,7 +77,41 @@ double WeightedRotated(const uint8_t* o, const uint8_t* c, const SVXMatchParams&
   return Score(WeightedNorm<kStep>(p), total);
 }
 
+template <int kStep>
+double Prepared(const uint8_t* o, const uint8_t* c, const SFieldSums& both,
+                const SVXMatchParams& p) {
+  SFieldSums minima;
+  ForVisited<kStep>([&](int i, int k) {
+    const uint8_t* x = o + 4 * (i + 20 * k);
+    const uint8_t* y = c + 4 * (i + 20 * k);
+    minima.Luma += std::min(x[0], y[0]);
+    minima.Color += std::min(x[1], y[1]) + std::min(x[2], y[2]);
+    minima.Shape += std::min(x[3], y[3]);
+  });
+  return Score(PlainNorm(p), Differences(both, minima).Total(p));
+}
+
+double PortablePrepared(const uint8_t* o, const uint8_t* c, const SFieldSums& both,
+                        const SVXMatchParams& p) {
+  return p.Fast ? Prepared<2>(o, c, both, p) : Prepared<1>(o, c, both, p);
+}
+
 }  // namespace
+
+SFieldSums VisitedSums(const uint8_t* cells, int step) {
+  SFieldSums sums;
+  for (int k = 0; k < 20; k += step) {
+    for (int i = 0; i < 20; i += step) {
+      const uint8_t* x = cells + 4 * (i + 20 * k);
+      sums.Luma += x[0];
+      sums.Color += x[1] + x[2];
+      sums.Shape += x[3];
+    }
+  }
+  return sums;
+}
+
+PreparedFn PortablePreparedQuick() { return PortablePrepared; }
 
 const SKernelSet& PortableQuickKernels() {
   static const SKernelSet kernels = {ByStep<Plain<1>, Plain<2>>, ByStep<Weighted<1>, Weighted<2>>,
@@ -89,7 +123,29 @@ const SKernelSet& PortableQuickKernels() {
 }  // namespace vxmatch
 
 double MatchCSQuick(const SVXDBRec_3& o, const SVXDBRec_3& c, const SVXMatchParams& p) {
-  static const vxmatch::SKernelSet& kernels =
-      vxmatch::Avx2QuickKernels() ? *vxmatch::Avx2QuickKernels() : vxmatch::PortableQuickKernels();
+  static const vxmatch::SKernelSet kernels = [] {
+    vxmatch::SKernelSet best = vxmatch::Avx2QuickKernels() ? *vxmatch::Avx2QuickKernels()
+                                                           : vxmatch::PortableQuickKernels();
+    if (vxmatch::Avx512PlainQuick()) best.Plain = vxmatch::Avx512PlainQuick();
+    return best;
+  }();
   return kernels.Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p);
+}
+
+SVXQuickCells PrepareQuick(const SVXDBRec_3& r, bool fast) {
+  const vxmatch::SFieldSums sums = vxmatch::VisitedSums(vxmatch::CellBytes(r), fast ? 2 : 1);
+  return {&r, sums.Luma, sums.Color, sums.Shape};
+}
+
+double MatchCSQuickPrepared(const SVXQuickCells& o, const SVXQuickCells& c,
+                            const SVXMatchParams& p) {
+  static const vxmatch::PreparedFn kernel =
+      vxmatch::Avx512PreparedQuick() ? vxmatch::Avx512PreparedQuick()
+      : vxmatch::Avx2PreparedQuick() ? vxmatch::Avx2PreparedQuick()
+                                     : vxmatch::PortablePreparedQuick();
+  vxmatch::SFieldSums both;
+  both.Luma = o.Luma + c.Luma;
+  both.Color = o.Color + c.Color;
+  both.Shape = o.Shape + c.Shape;
+  return kernel(vxmatch::CellBytes(*o.Record), vxmatch::CellBytes(*c.Record), both, p);
 }

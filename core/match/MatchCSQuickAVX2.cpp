@@ -8,42 +8,7 @@ namespace vxmatch {
 
 namespace {
 
-// ---- Unweighted: byte differences summed per field in 16-bit lanes. ----
-// One 32-byte chunk is 8 cells; a lane sees at most 50 chunks, 50 * 255 fits in 15 bits.
-
-// Low bytes of the 16-bit lanes hold C1 and C3, high bytes C2 and Shape, alternately.
-struct SLaneSums {
-  __m256i Low;
-  __m256i High;
-};
-
-VX_AVX2 inline SLaneSums ZeroSums() { return {_mm256_setzero_si256(), _mm256_setzero_si256()}; }
-
-VX_AVX2 inline SLaneSums Added(SLaneSums s, __m256i diff) {
-  return {_mm256_add_epi16(s.Low, _mm256_and_si256(diff, _mm256_set1_epi16(0xFF))),
-          _mm256_add_epi16(s.High, _mm256_srli_epi16(diff, 8))};
-}
-
-VX_AVX2 inline void Add(SLaneSums& s, __m256i diff) { s = Added(s, diff); }
-
-VX_AVX2 inline SFieldSums Reduce(const SLaneSums& s) {
-  const __m256i first = _mm256_set1_epi32(1);         // the even 16-bit lane of each pair
-  const __m256i second = _mm256_set1_epi32(1 << 16);  // the odd one
-  const __m256i luma = _mm256_madd_epi16(s.Low, first);
-  const __m256i color =
-      _mm256_add_epi32(_mm256_madd_epi16(s.Low, second), _mm256_madd_epi16(s.High, first));
-  const __m256i shape = _mm256_madd_epi16(s.High, second);
-  // Pairwise sums down to luma, color, shape, shape in each half.
-  const __m256i pairs =
-      _mm256_hadd_epi32(_mm256_hadd_epi32(luma, color), _mm256_hadd_epi32(shape, shape));
-  const __m128i sums =
-      _mm_add_epi32(_mm256_castsi256_si128(pairs), _mm256_extracti128_si256(pairs, 1));
-  SFieldSums result;
-  result.Luma = static_cast<uint32_t>(_mm_extract_epi32(sums, 0));
-  result.Color = static_cast<uint32_t>(_mm_extract_epi32(sums, 1));
-  result.Shape = static_cast<uint32_t>(_mm_extract_epi32(sums, 2));
-  return result;
-}
+// ---- Unweighted: byte differences summed per field in 16-bit lanes (SLaneSums). ----
 
 // Fast visits even rows of even columns. Chunk q of each run of five (40 cells, two columns)
 // holds: q 0 and 1, rows 0-15 of the even column; q 2, rows 16-19 of it and 4 cells of the odd
@@ -68,31 +33,47 @@ VX_AVX2 inline __m256i ChunkDiff(const uint8_t* o, const uint8_t* c, int v) {
   return AbsDiff(Load32(o + 32 * v), Load32(c + 32 * v));
 }
 
-// Without Fast two sets of sums over alternate chunks keep more additions in flight.
-template <bool kFast>
-VX_AVX2 double Plain(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
-  SLaneSums sums = ZeroSums();
+VX_AVX2 inline __m256i ChunkMin(const uint8_t* o, const uint8_t* c, int v) {
+  return _mm256_min_epu8(Load32(o + 32 * v), Load32(c + 32 * v));
+}
+
+// The field sums of chunk(o, c, v) over the visited cells. Without Fast two sets of sums over
+// alternate chunks keep more additions in flight.
+template <bool kFast, __m256i (*kChunk)(const uint8_t*, const uint8_t*, int)>
+VX_AVX2 inline SFieldSums SumChunks(const uint8_t* o, const uint8_t* c) {
   if constexpr (kFast) {
+    SLaneSums sums = ZeroSums();
     const __m256i rows = FastMask(0), top = FastMask(2);
     for (int run = 0; run < 50; run += 5) {
-      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run), rows));
-      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run + 1), rows));
-      Add(sums, _mm256_and_si256(ChunkDiff(o, c, run + 2), top));
+      Add(sums, _mm256_and_si256(kChunk(o, c, run), rows));
+      Add(sums, _mm256_and_si256(kChunk(o, c, run + 1), rows));
+      Add(sums, _mm256_and_si256(kChunk(o, c, run + 2), top));
     }
+    return Reduce(sums);
   } else {
-    const __m256i low = _mm256_set1_epi16(0xFF);
-    __m256i even_low = _mm256_setzero_si256(), even_high = _mm256_setzero_si256();
-    __m256i odd_low = _mm256_setzero_si256(), odd_high = _mm256_setzero_si256();
+    SLaneSums even = ZeroSums(), odd = ZeroSums();
     for (int v = 0; v < 50; v += 2) {
-      const __m256i even = ChunkDiff(o, c, v), odd = ChunkDiff(o, c, v + 1);
-      even_low = _mm256_add_epi16(_mm256_and_si256(even, low), even_low);
-      even_high = _mm256_add_epi16(_mm256_srli_epi16(even, 8), even_high);
-      odd_low = _mm256_add_epi16(_mm256_and_si256(odd, low), odd_low);
-      odd_high = _mm256_add_epi16(_mm256_srli_epi16(odd, 8), odd_high);
+      Add(even, kChunk(o, c, v));
+      Add(odd, kChunk(o, c, v + 1));
     }
-    sums = {_mm256_add_epi16(even_low, odd_low), _mm256_add_epi16(even_high, odd_high)};
+    return Reduce(Joined(even, odd));
   }
-  return Score(PlainNorm(p), Reduce(sums).Total(p));
+}
+
+template <bool kFast>
+VX_AVX2 double Plain(const uint8_t* o, const uint8_t* c, const SVXMatchParams& p) {
+  return Score(PlainNorm(p), SumChunks<kFast, ChunkDiff>(o, c).Total(p));
+}
+
+template <bool kFast>
+VX_AVX2 double Prepared(const uint8_t* o, const uint8_t* c, const SFieldSums& both,
+                        const SVXMatchParams& p) {
+  return Score(PlainNorm(p), Differences(both, SumChunks<kFast, ChunkMin>(o, c)).Total(p));
+}
+
+VX_AVX2 double AnyPrepared(const uint8_t* o, const uint8_t* c, const SFieldSums& both,
+                           const SVXMatchParams& p) {
+  return p.Fast ? Prepared<true>(o, c, both, p) : Prepared<false>(o, c, both, p);
 }
 
 // Byte offsets of the 4 cells of o that o flipped in k shows at cells 4h to 4h + 3: the same
@@ -265,9 +246,12 @@ const SKernelSet* Avx2QuickKernels() {
   return CpuHasAvx2() ? &kernels : nullptr;
 }
 
+PreparedFn Avx2PreparedQuick() { return CpuHasAvx2() ? AnyPrepared : nullptr; }
+
 #else
 
 const SKernelSet* Avx2QuickKernels() { return nullptr; }
+PreparedFn Avx2PreparedQuick() { return nullptr; }
 
 #endif
 

@@ -43,6 +43,24 @@ double MatchHistogram(const CHist& o, double weight, const CHist& c);
 // Colour and shape distance of every visited cell pair against the largest possible.
 double MatchCSQuick(const SVXDBRec_3& o, const SVXDBRec_3& c, const SVXMatchParams& p);
 
+// One record made ready for MatchCSQuickPrepared: its cells and the sums of their fields over
+// the cells that an unweighted, unrotated MatchCSQuick visits. Points into the record, which must
+// outlive it.
+struct SVXQuickCells {
+  const SVXDBRec_3* Record = nullptr;
+  uint32_t Luma = 0;   // sum of C1
+  uint32_t Color = 0;  // sum of C2 and C3
+  uint32_t Shape = 0;  // sum of Shape
+};
+
+// `r` made ready; `fast` must be the Fast of the comparisons it will take part in.
+SVXQuickCells PrepareQuick(const SVXDBRec_3& r, bool fast);
+
+// MatchCSQuick without Rotate and weights, to the bit, for records prepared once and compared
+// many times: since |x - y| = x + y - 2 min(x, y), the comparison itself sums only the minima.
+double MatchCSQuickPrepared(const SVXQuickCells& o, const SVXQuickCells& c,
+                            const SVXMatchParams& p);
+
 // As MatchCSQuick, but a cell whose colour is too far off may match a neighbour of the
 // candidate's cell at a price. The norm is never weighted, so weights above 1 can bring the score
 // to 0. Neighbours outside the record never match (see MatchCSFuzzy.h).

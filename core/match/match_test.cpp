@@ -247,8 +247,16 @@ std::vector<const vxmatch::SKernelSet*> Implementations(const vxmatch::SKernelSe
   if (avx2) all.push_back(avx2);
   return all;
 }
+// With AVX-512BW, also the portable set with the 64-byte plain walk in place.
 std::vector<const vxmatch::SKernelSet*> QuickImplementations() {
-  return Implementations(vxmatch::PortableQuickKernels(), vxmatch::Avx2QuickKernels());
+  static const vxmatch::SKernelSet withAvx512 = [] {
+    vxmatch::SKernelSet set = vxmatch::PortableQuickKernels();
+    if (vxmatch::Avx512PlainQuick()) set.Plain = vxmatch::Avx512PlainQuick();
+    return set;
+  }();
+  auto all = Implementations(vxmatch::PortableQuickKernels(), vxmatch::Avx2QuickKernels());
+  if (vxmatch::Avx512PlainQuick()) all.push_back(&withAvx512);
+  return all;
 }
 std::vector<const vxmatch::SKernelSet*> FuzzyImplementations() {
   return Implementations(vxmatch::PortableFuzzyKernels(), vxmatch::Avx2FuzzyKernels());
@@ -262,6 +270,23 @@ TEST(MatchKernels, AgreeWithReferenceForEverySetting) {
       ExpectSame(quick, MatchCSQuick(o, c, p));
       for (const auto* k : QuickImplementations()) {
         ExpectSame(quick, k->Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p));
+      }
+      if (!p.Rotate && !p.Weighted()) {
+        // Prepared records must give MatchCSQuick's result to the bit, in every implementation.
+        const SVXQuickCells po = PrepareQuick(o, p.Fast), pc = PrepareQuick(c, p.Fast);
+        const double want = MatchCSQuick(o, c, p);
+        EXPECT_EQ(want, MatchCSQuickPrepared(po, pc, p));
+        vxmatch::SFieldSums both;
+        both.Luma = po.Luma + pc.Luma;
+        both.Color = po.Color + pc.Color;
+        both.Shape = po.Shape + pc.Shape;
+        for (vxmatch::PreparedFn k :
+             {vxmatch::PortablePreparedQuick(), vxmatch::Avx2PreparedQuick(),
+              vxmatch::Avx512PreparedQuick()}) {
+          if (k) {
+            EXPECT_EQ(want, k(vxmatch::CellBytes(o), vxmatch::CellBytes(c), both, p));
+          }
+        }
       }
       const double fuzzy = ref.Fuzzy(o, c);
       ExpectSame(fuzzy, MatchCSFuzzy(o, c, p));
@@ -340,6 +365,23 @@ TEST(MatchKernels, IdenticalRecordsScore100AndTurnedOnesNeedRotate) {
       EXPECT_LT(MatchDuplicates(o, turned, p), 100.0);
     }
   });
+}
+
+// Bytes of 255 drive the 16-bit lane sums of the vector walks to their largest values.
+TEST(MatchKernels, PreparedQuickAtTheByteExtremes) {
+  Rec full{}, empty{};
+  std::memset(Bytes(full), 255, 1600);
+  for (bool fast : {false, true}) {
+    SVXMatchParams p;
+    p.Fast = fast;
+    auto prepared = [&](const Rec& o, const Rec& c) {
+      return MatchCSQuickPrepared(PrepareQuick(o, fast), PrepareQuick(c, fast), p);
+    };
+    EXPECT_EQ(100.0, prepared(full, full));
+    EXPECT_EQ(0.0, prepared(full, empty));
+    EXPECT_EQ(0.0, prepared(empty, full));
+    EXPECT_EQ(0.0, MatchCSQuick(full, empty, p));
+  }
 }
 
 TEST(MatchKernels, AllZeroMaskLeavesQuickWithoutNorm) {

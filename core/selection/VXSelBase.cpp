@@ -482,24 +482,71 @@ bool CVXSelBase::CheckMatch(double& score) {
   const SVXDBRec_3* original = SelEngine->GetOriginalShapeInfo();
   const SVXDBRec_3& o = original ? *original : kNoShape;
   const SVXDBRec_3& c = *SelEngine->GetCurrentShapeInfo();
+  score = Match.Method == 1 ? MatchHistogram() : MatchWithoutHistogram_(o, c);
+  // A strong colour weight lets the histogram have half the say.
+  if (Match.Method != 0 && Match.ColorWeight >= 30) score = (MatchHistogram() + score) * 0.5;
+  return true;
+}
+
+double CVXSelBase::MatchWithoutHistogram_(const SVXDBRec_3& o, const SVXDBRec_3& c) const {
   switch (Match.Method) {
     case 0:
-      score = MatchDuplicates(o, c);
-      return true;
-    case 1:
-      score = MatchHistogram();
-      break;
+      return MatchDuplicates(o, c);
     case 2:
-      score = Match.Precision == 0   ? MatchCSQuick(o, c)
-              : Match.Precision == 1 ? MatchCSFuzzy(o, c)
-                                     : 0;
-      break;
+      return Match.Precision == 0   ? MatchCSQuick(o, c)
+             : Match.Precision == 1 ? MatchCSFuzzy(o, c)
+                                    : 0;
     default:
-      score = 0;
+      return 0;
   }
-  // A strong colour weight lets the histogram have half the say.
-  if (Match.ColorWeight >= 30) score = (MatchHistogram() + score) * 0.5;
-  return true;
+}
+
+// Rows 1, 3, 4 and 11 of Check may run: Limits, folders and categories add a constant 100, and
+// the match score comes from the records. A histogram is built per original and candidate by
+// the engine, and the weighted Fast quick walk stops early by the running cut-off, so both keep
+// to Check.
+bool CVXSelBase::ScoresByShapesAlone() const {
+  if (FileFormat.Active || FileDateTime.Active || Dimensions.Active || FileSize.Active ||
+      FileName.Active || Color.Active || !PropSelectors.empty() || PlugInsTakePart_()) {
+    return false;
+  }
+  if (!Match.Active || (Limits.Active && Limits.ExactDuplicates != 0)) return false;
+  if (Match.Method == 1 || (Match.Method != 0 && Match.ColorWeight >= 30)) return false;
+  const bool quick = Match.Method == 2 && Match.Precision == 0;
+  return !(quick && Match.Fast && !Match.Rotate && MatchParams_().Weighted());
+}
+
+bool CVXSelBase::QuickPrepared_() const {
+  return Match.Method == 2 && Match.Precision == 0 && !Match.Rotate && !MatchParams_().Weighted();
+}
+
+void CVXSelBase::PrepareShape(const SVXDBRec_3& record, SPreparedShape& prepared) const {
+  prepared.Record = &record;
+  if (QuickPrepared_()) prepared.Quick = PrepareQuick(record, Match.Fast);
+}
+
+// Check's rows in Check's order: limits, folders and categories add 100 each, exactly, and
+// the match score comes last, so that the sum rounds as there.
+void CVXSelBase::ScoreShapes(const SPreparedShape& original, const SPreparedShape* candidates,
+                             size_t count, double* scores, uint8_t* passed) const {
+  double constant = 0;
+  unsigned rows = 1;
+  for (bool active : {Limits.Active, Folders.Active, Categories.Active}) {
+    if (active) {
+      constant += 100;
+      ++rows;
+    }
+  }
+  const bool gated = Limits.Active && Limits.Mode == 1;
+  const bool prepared = QuickPrepared_();
+  const SVXMatchParams params = MatchParams_();
+  for (size_t j = 0; j < count; ++j) {
+    const double match = prepared
+                             ? MatchCSQuickPrepared(original.Quick, candidates[j].Quick, params)
+                             : MatchWithoutHistogram_(*original.Record, *candidates[j].Record);
+    passed[j] = !(gated && match < Limits.MinScore);
+    scores[j] = (constant + match) / rows;
+  }
 }
 
 bool CVXSelBase::CheckPlugIns(double& score) {

@@ -47,6 +47,22 @@ class CVXSelBase : public CVXBase {
   // Scores the engine's current candidate against its current original. False: no hit.
   virtual bool Check(double& score, double minScore);
 
+  // A shape record with what ScoreShapes prepares of it once per run.
+  struct SPreparedShape {
+    const SVXDBRec_3* Record = nullptr;  // not owned
+    SVXQuickCells Quick;
+  };
+  // True when Check's verdict on a candidate against an original follows from their shape
+  // records alone, the same whatever the running cut-off, and Check would change no state:
+  // then ScoreShapes may score many pairs at once, on several threads.
+  bool ScoresByShapesAlone() const;
+  void PrepareShape(const SVXDBRec_3& record, SPreparedShape& prepared) const;
+  // Check with a cut-off of 0 for `original` against each of `count` candidates: passed[j]
+  // is 0 where Check rejects, and scores[j] holds the score. Only when ScoresByShapesAlone();
+  // changes nothing, so that threads may call it at once.
+  void ScoreShapes(const SPreparedShape& original, const SPreparedShape* candidates, size_t count,
+                   double* scores, uint8_t* passed) const;
+
   // File-name comparisons (0 = same).
   double SmartMatchFileName(const char* a, const char* b) const;
   double LooseMatchFileName(const char* a, const char* b) const;
@@ -128,6 +144,10 @@ class CVXSelBase : public CVXBase {
   // The original under test; an empty record when the run has none.
   const CVXCatFile& Original_() const;
   SVXMatchParams MatchParams_() const;
+  // The score of CheckMatch for the methods that need no histogram.
+  double MatchWithoutHistogram_(const SVXDBRec_3& o, const SVXDBRec_3& c) const;
+  // Whether the method and its settings score by MatchCSQuickPrepared.
+  bool QuickPrepared_() const;
 
   void LoadPropSelectors_(const CVXSelector& selector);
   void PreSelectXMP_(CBitVector& candidates);

@@ -7,18 +7,25 @@
 #include <chrono>
 #include <cmath>
 #include <cstring>
+#include <thread>
 
 #include "VXEngine.h"
 #include "VXException.h"
 #include "VXLog.h"
 #include "VXResult.h"
 #include "VXSelBase.h"
+#include "VXSelBlockScorer.h"
 #include "VXSelPrefetch.h"
 #include "xstring.h"
 
 namespace {
 
 constexpr unsigned VX_PLUGIN_PREPARE_FAILED = 13001;
+
+// Scoring by blocks pays from this many originals on; a block holds up to this many candidates,
+// whose records stay in the core's cache while each original is read once.
+constexpr size_t kBlockScoringOriginals = 32;
+constexpr size_t kBlockCandidates = 32;
 
 int64_t NowMs() {
   using namespace std::chrono;
@@ -42,7 +49,8 @@ bool SameLocation(const CVXURI& a, const CVXURI& b) {
 
 }  // namespace
 
-CVXSelEngine::CVXSelEngine(CVXEngine* engine) : engine_(engine) {
+CVXSelEngine::CVXSelEngine(CVXEngine* engine)
+    : engine_(engine), scoringThreads_(std::max(1u, std::thread::hardware_concurrency())) {
   workers_.push_back(std::make_unique<CVXSelBase>(this));
 }
 
@@ -116,6 +124,7 @@ unsigned CVXSelEngine::Run(CVXResultSet& result) {
   }
   // Clean-up, also after an exception: no reading thread may outlive the buffer.
   WaitPrefetch();
+  scorer_.reset();
   shapeBuffer_.reset();
   originalShapes_.clear();
   shapeCache_.clear();
@@ -303,6 +312,7 @@ void CVXSelEngine::MainLoop_(CVXResultSet& result, bool needsShape) {
     VX_ERROR(engine_->LogFile(), VX_UNKNOWN_EXCEPTION, "Prefetch");
   }
   entryCutOffs_.assign(result.Properties().Entries.size(), 0.0);
+  StartBlockScoring_(result, needsShape);
   lastPercent_ = 0;
   lastReportMs_ = NowMs();
   for (candidatePos_ = 0; candidatePos_ < candidates_.size() && !aborted_; ++candidatePos_) {
@@ -355,35 +365,110 @@ void CVXSelEngine::ScoreWithoutOriginals_(CVXResultSet& result) {
   }
 }
 
+bool CVXSelEngine::IsCandidate_(const SVXResultSetEntry& entry, const CVXURI& uri) const {
+  return entry.OID != 0 ? entry.OID == currentOid_ : SameLocation(entry.URI, uri);
+}
+
+bool CVXSelEngine::EnterEntry_(std::vector<SVXResultSetEntry>& entries, size_t i, const CVXURI& uri,
+                               bool needsShape) {
+  SVXResultSetEntry& entry = entries[i];
+  currentOriginal_ = &entry.File;
+  currentEntry_ = &entry;
+  if (needsShape) originalShape_ = i < originalShapes_.size() ? &originalShapes_[i] : &emptyShape_;
+  return !IsCandidate_(entry, uri);
+}
+
 void CVXSelEngine::ScoreWithOriginals_(CVXResultSet& result, const CVXURI& uri, bool needsShape) {
+  if (scorer_) return ScoreFromBlock_(result, uri);
   auto& entries = result.Properties().Entries;
-  const double w = static_cast<double>(workers_.size());
   for (size_t i = 0; i < entries.size() && !aborted_; ++i) {
-    SVXResultSetEntry& entry = entries[i];
-    currentOriginal_ = &entry.File;
-    currentEntry_ = &entry;
-    if (needsShape)
-      originalShape_ = i < originalShapes_.size() ? &originalShapes_[i] : &emptyShape_;
-    if (entry.OID != 0 ? entry.OID == currentOid_ : SameLocation(entry.URI, uri)) continue;
+    if (!EnterEntry_(entries, i, uri, needsShape)) continue;
     double sum = 0;
     if (limits_.ExactDuplicates) {
-      if (entry.File.Properties().CRC != currentFile_.Properties().CRC) continue;
+      if (entries[i].File.Properties().CRC != currentFile_.Properties().CRC) continue;
       sum = 100;
-    } else if (!SumWorkers_(cutOffInForce_ ? entryCutOffs_[i] : 0, sum)) {
+    } else if (!SumWorkers_(MinScoreOf_(i), sum)) {
       continue;
     }
-    const bool greyDiffers =
-        ((entry.File.Properties().Flags ^ currentFile_.Properties().Flags) & cfGreyscale) != 0;
-    if (fileFormat_.Active && fileFormat_.GrayScaleMode == 1 && greyDiffers) sum *= 0.75;
-    double& c = entryCutOffs_[i];
-    c = c >= 1e-6 ? std::min(c, sum / w) : sum / w;
-    if (c > sum) continue;
-    entry.Hits.push_back({currentOid_, currentFile_.Properties().Folder, sum / w});
-    if (interval_ != 0 && entry.Hits.size() > limits_.MaxResults + interval_) {
-      cutOffInForce_ = true;
-      c = ResultCutOff(entry);
+    AddHit_(entries[i], i, sum);
+  }
+}
+
+void CVXSelEngine::AddHit_(SVXResultSetEntry& entry, size_t i, double sum) {
+  const double w = static_cast<double>(workers_.size());
+  const bool greyDiffers =
+      ((entry.File.Properties().Flags ^ currentFile_.Properties().Flags) & cfGreyscale) != 0;
+  if (fileFormat_.Active && fileFormat_.GrayScaleMode == 1 && greyDiffers) sum *= 0.75;
+  double& c = entryCutOffs_[i];
+  c = c >= 1e-6 ? std::min(c, sum / w) : sum / w;
+  if (!(c <= sum)) return;
+  entry.Hits.push_back({currentOid_, currentFile_.Properties().Folder, sum / w});
+  if (interval_ != 0 && entry.Hits.size() > limits_.MaxResults + interval_) {
+    cutOffInForce_ = true;
+    c = ResultCutOff(entry);
+  }
+}
+
+// ---- Scoring by blocks
+//
+// With one worker that scores by shape records alone, the scores of a candidate against every
+// original do not depend on the running cut-offs: the cut-off only decides whether Check
+// reports the score. So the scores of a block of candidates are made at once, on several
+// threads, and the candidates then pass through the entries one by one as in
+// ScoreWithOriginals_, each entry taking its score from the block. The candidate's record is
+// still asked for where the plain walk asks for it, so the read-ahead runs alike.
+
+void CVXSelEngine::StartBlockScoring_(CVXResultSet& result, bool needsShape) {
+  scorer_.reset();
+  const auto& entries = result.Properties().Entries;
+  if (scoringThreads_ < 2 || !needsShape || !selector_.Properties().NeedsOriginals ||
+      limits_.ExactDuplicates || workers_.size() != 1 || entries.size() < kBlockScoringOriginals ||
+      !workers_[0]->ScoresByShapesAlone()) {
+    return;
+  }
+  std::vector<const SVXDBRec_3*> originals;
+  for (size_t i = 0; i < entries.size(); ++i) {
+    originals.push_back(i < originalShapes_.size() ? &originalShapes_[i] : &emptyShape_);
+  }
+  scorer_ = std::make_unique<CVXSelBlockScorer>(*workers_[0], originals, scoringThreads_);
+  blockFirst_ = 0;
+}
+
+void CVXSelEngine::ScoreBlock_(const SVXDBRec_3* shape) {
+  std::vector<const SVXDBRec_3*> block = {shape};
+  for (size_t pos = candidatePos_ + 1; pos < candidates_.size() && block.size() < kBlockCandidates;
+       ++pos) {
+    auto it = shapeCache_.find(candidates_[pos]);
+    if (it == shapeCache_.end()) break;
+    block.push_back(it->second);
+  }
+  scorer_->ScoreBlock(block);
+  blockFirst_ = candidatePos_;
+}
+
+void CVXSelEngine::ScoreFromBlock_(CVXResultSet& result, const CVXURI& uri) {
+  auto& entries = result.Properties().Entries;
+  const size_t n = entries.size();
+  size_t i = 0;
+  while (i < n && IsCandidate_(entries[i], uri)) ++i;
+  if (i < n) {
+    // Where Check would first have asked for the candidate's record.
+    const SVXDBRec_3* shape = GetCurrentShapeInfo();
+    size_t b = candidatePos_ - blockFirst_;
+    if (candidatePos_ < blockFirst_ || b >= scorer_->Candidates() ||
+        scorer_->Candidate(b) != shape) {
+      ScoreBlock_(shape);
+      b = 0;
+    }
+    for (; i < n; ++i) {
+      if (!scorer_->Passed(b, i)) continue;
+      const double sum = scorer_->Score(b, i);
+      if (!(sum >= MinScoreOf_(i)) || !EnterEntry_(entries, i, uri, true)) continue;
+      AddHit_(entries[i], i, sum);
     }
   }
+  // The walk over the entries ends at the last one.
+  EnterEntry_(entries, n - 1, uri, true);
 }
 
 // ---- Results

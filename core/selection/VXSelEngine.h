@@ -4,6 +4,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -21,6 +22,7 @@
 class CVXBitmap;
 class CVXEngine;
 class CVXSelBase;
+class CVXSelBlockScorer;
 
 // An image that candidates are compared with. OID 0: a file the catalog does not hold.
 struct SVXFileDescriptor {
@@ -93,6 +95,11 @@ class CVXSelEngine : public CVXBase {
  protected:
   // Workers are owned; a derived engine may add more after the constructor's one.
   std::vector<std::unique_ptr<CVXSelBase>>& Workers() { return workers_; }
+  // Threads, the caller's included, that may score candidates against many originals at once
+  // when the only worker scores by shape records alone; the result and the feedback are those
+  // of scoring on the caller's thread. 1 keeps every run on that thread. Default: one per
+  // processor.
+  void SetScoringThreads(unsigned threads) { scoringThreads_ = threads < 1 ? 1 : threads; }
 
  private:
   void ResetRun_(CVXResultSet& result);
@@ -107,6 +114,19 @@ class CVXSelEngine : public CVXBase {
   void MainLoop_(CVXResultSet& result, bool needsShape);
   void ScoreWithoutOriginals_(CVXResultSet& result);
   void ScoreWithOriginals_(CVXResultSet& result, const CVXURI& uri, bool needsShape);
+  // The candidate from the scores of its block, with the outcome of ScoreWithOriginals_.
+  void ScoreFromBlock_(CVXResultSet& result, const CVXURI& uri);
+  // Scores the current candidate and those after it whose records the bank holds.
+  void ScoreBlock_(const SVXDBRec_3* shape);
+  void StartBlockScoring_(CVXResultSet& result, bool needsShape);
+  // Makes entry i the current one; false when it is the candidate itself.
+  bool EnterEntry_(std::vector<SVXResultSetEntry>& entries, size_t i, const CVXURI& uri,
+                   bool needsShape);
+  bool IsCandidate_(const SVXResultSetEntry& entry, const CVXURI& uri) const;
+  // The cut-off that entry i's checks must reach.
+  double MinScoreOf_(size_t i) const { return cutOffInForce_ ? entryCutOffs_[i] : 0; }
+  // Applies the grey-scale penalty to the sum of entry i and keeps the hit if it makes the cut.
+  void AddHit_(SVXResultSetEntry& entry, size_t i, double sum);
   bool SumWorkers_(double minScore, double& sum);
   void PrepareResults_(CVXResultSet& result);
   void Finish_(CVXResultSet& result);
@@ -136,7 +156,7 @@ class CVXSelEngine : public CVXBase {
   CHist currentHist_;
   std::vector<uint32_t> candidates_;
   size_t candidatePos_ = 0;
-  std::map<uint32_t, const SVXDBRec_3*> shapeCache_;
+  std::unordered_map<uint32_t, const SVXDBRec_3*> shapeCache_;  // the bank last read
   // The record GetCurrentShapeInfo last gave, for that OID; null after a reset.
   const SVXDBRec_3* currentShape_ = nullptr;
   uint32_t currentShapeOid_ = 0;
@@ -148,4 +168,7 @@ class CVXSelEngine : public CVXBase {
   uint32_t interval_ = 0;
   bool cutOffInForce_ = false;
   std::vector<double> entryCutOffs_;  // running cut-off per result entry
+  unsigned scoringThreads_;
+  std::unique_ptr<CVXSelBlockScorer> scorer_;  // only while a run scores by blocks
+  size_t blockFirst_ = 0;                      // candidate position of the block's first
 };

@@ -4,6 +4,7 @@
 #include <system_error>
 
 #include "VXEngine.h"
+#include "VXLog.h"
 #include "VXResult.h"
 
 void CManualResetEvent::Set() {
@@ -26,6 +27,27 @@ namespace {
 
 SPrefetchBlock gPrefetch;  // constructed at library load, signalled
 
+// A block is read in slices of this many records. Each read holds the engine's lock, which the
+// candidate loop takes twice per candidate to read the catalog: a whole block at once would stop
+// the loop for as long as the read lasts, and the two threads would take turns instead of
+// overlapping.
+constexpr size_t kReadSlice = 200;
+
+// Reads the selectors into `bank`, slice by slice; the first failure ends the read.
+unsigned ReadSlices(CVXEngine& engine, const std::vector<CQRLBlobDB::SSelector>& selectors,
+                    uint8_t* bank) {
+  std::vector<CQRLBlobDB::SSelector> slice;
+  for (size_t at = 0; at < selectors.size(); at += kReadSlice) {
+    const size_t end = std::min(selectors.size(), at + kReadSlice);
+    slice.assign(selectors.begin() + static_cast<ptrdiff_t>(at),
+                 selectors.begin() + static_cast<ptrdiff_t>(end));
+    if (unsigned rc = engine.GetShapeData(slice, bank + at * kShapeRecordBytes); rc != VX_OK) {
+      return rc;
+    }
+  }
+  return VX_OK;
+}
+
 // The reading thread: one block of at most 2000 records into the current bank.
 void ReadBlock() {
   SPrefetchBlock& p = gPrefetch;
@@ -35,7 +57,8 @@ void ReadBlock() {
   if (p.Position < candidates.size()) {
     size_t k = std::min(candidates.size() - p.Position, kPrefetchBankRecords);
     for (size_t i = 0; i < k; ++i) p.Selectors.emplace_back(2, candidates[p.Position++]);
-    p.Result = p.Engine->GetShapeData(p.Selectors, p.Buffer + p.Bank * kPrefetchBankBytes);
+    p.Result = ReadSlices(*p.Engine, p.Selectors, p.Buffer + p.Bank * kPrefetchBankBytes);
+    if (p.Result != VX_OK) VX_ERROR(p.Engine->LogFile(), p.Result, "Prefetch of shape records");
   }
   p.Event.Set();
 }
