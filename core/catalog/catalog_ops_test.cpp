@@ -134,6 +134,16 @@ TEST_F(CatalogOps, MoveAndCopyReplaceFilesInTheWay) {
   Reopen();
   EXPECT_EQ(Cat().LookupFile("a.jpg", dst), copy);
   EXPECT_EQ(Folder(src).Files(), std::vector<uint32_t>{b});
+
+  // A crash between the stores of a move can leave the file listed in both folders; moving it
+  // again must not take it for the file in its way.
+  CVXFolder both = Folder(dst);
+  both.AddFile(b);
+  ASSERT_EQ(Cat().UpdateFolder(both), VX_OK);
+  ASSERT_EQ(Cat().MoveFile(b, dst, ""), VX_OK);
+  EXPECT_EQ(Cat().LookupFile("b.jpg", dst), b);
+  EXPECT_EQ(Folder(dst).Files(), (std::vector<uint32_t>{static_cast<uint32_t>(copy), b}));
+  EXPECT_TRUE(Folder(src).Files().empty());
 }
 
 TEST_F(CatalogOps, RenameAndUpdateFiles) {

@@ -336,7 +336,10 @@ unsigned CVXCatalog::MoveFile(uint32_t oid, uint32_t folderOid, const std::strin
     std::vector<uint32_t> targetFiles = target->Files();
     for (uint32_t other : targetFiles) {
       const CVXCatFile* o = GetFile(other);
-      if (!o || other == 0 || CVXCatFile::CompareNames(o->Name(), name) != 0) continue;
+      // A catalog cut short mid-move may list the file in both folders: it is not in its own way.
+      if (!o || other == 0 || other == oid || CVXCatFile::CompareNames(o->Name(), name) != 0) {
+        continue;
+      }
       if (unsigned rc = RemoveFile(other); rc != VX_OK) {
         VX_ERROR(Log_(), rc, "MoveFile: removing the file in the way");
         VX_THROW(rc);
