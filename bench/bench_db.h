@@ -6,6 +6,7 @@
 #include <sqlite3.h>
 #include <stdlib.h>
 
+#include <filesystem>
 #include <functional>
 #include <string>
 #include <vector>
@@ -20,11 +21,19 @@
 
 namespace vxbench {
 
-// A directory under /tmp that lives as long as the process (benchmarks keep their data).
+// The benchmarks' scratch directory. VXBENCH_DIR names one that is kept, so that a profiling
+// session builds its databases once; otherwise a fresh one under /tmp is removed at exit.
 inline std::string Scratch(const std::string& name) {
   static const std::string dir = [] {
+    if (const char* kept = getenv("VXBENCH_DIR"); kept && *kept) {
+      std::filesystem::create_directories(kept);
+      return std::string(kept);
+    }
     char tmpl[] = "/tmp/vxbench_XXXXXX";
-    return std::string(mkdtemp(tmpl));
+    if (!mkdtemp(tmpl)) std::abort();
+    static const std::string made(tmpl);
+    std::atexit([] { std::filesystem::remove_all(made); });
+    return made;
   }();
   return dir + "/" + name;
 }

@@ -78,6 +78,9 @@ class CVXCatalog : public CVXBase {
 
   // ---- Files. Lookups copy records out; 10020 when the object is absent.
   unsigned LookupFile(uint32_t oid, CVXCatFile& out) const;
+  // LookupFile for each of `count` OIDs into files[i], its answer into codes[i]. Quickest when
+  // the OIDs mostly ascend.
+  void LookupFiles(const uint32_t* oids, size_t count, CVXCatFile* files, unsigned* codes) const;
   unsigned GetFileURI(uint32_t oid, CVXURI& out) const;
   unsigned GetFileFolder(uint32_t oid, unsigned long& folder) const;
   // OID of the folder's first file of that name (case-insensitive), or 0.

@@ -73,6 +73,18 @@ unsigned CVXCatalog::LookupFile(uint32_t oid, CVXCatFile& out) const {
   return VX_OK;
 }
 
+void CVXCatalog::LookupFiles(const uint32_t* oids, size_t count, CVXCatFile* files,
+                             unsigned* codes) const {
+  auto it = files_.end();
+  for (size_t i = 0; i < count; ++i) {
+    // The next record along the map is most often the one asked for: no search then.
+    if (it != files_.end()) ++it;
+    if (it == files_.end() || it->first != oids[i]) it = files_.find(oids[i]);
+    codes[i] = it == files_.end() ? VX_NOT_FOUND : VX_OK;
+    if (codes[i] == VX_OK) files[i] = it->second;
+  }
+}
+
 unsigned CVXCatalog::GetFileURI(uint32_t oid, CVXURI& out) const {
   auto it = files_.find(oid);
   if (it == files_.end()) return VX_NOT_FOUND;

@@ -110,6 +110,7 @@ unsigned CVXEngine::CheckMutable_(uint64_t bytes) const {
 
 void CVXEngine::SetUpdated_() {
   modified_ = true;
+  changes_.fetch_add(1, std::memory_order_acq_rel);
   coreInfo_.LastUpdate = static_cast<int32_t>(std::time(nullptr));
 }
 
@@ -389,6 +390,7 @@ unsigned CVXEngine::Flush() {
 
 unsigned CVXEngine::Close() {
   std::lock_guard<std::recursive_mutex> lock(lock_);
+  changes_.fetch_add(1, std::memory_order_acq_rel);
   VX_LOG(log_, 2, "+ VXEngine::Close");
   unsigned rc = VX_OK;
   // A failed Open may have opened the catalog before the match store: close whatever is open.

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <map>
@@ -43,6 +44,9 @@ class CVXEngine : public CVXBase {
   ~CVXEngine() override;
 
   virtual bool IsModified() const;
+  // Counts the changes made through the engine, closing included, from any thread. Records
+  // copied out stay current while the count stays.
+  uint64_t Changes() const { return changes_.load(std::memory_order_acquire); }
 
   unsigned Create(const SVXCreateInfo& info);
   // The callback lives only until Open returns; the engine clears it before it does.
@@ -111,6 +115,11 @@ class CVXEngine : public CVXBase {
   unsigned SetFile(CVXCatFile& file, const CVXBitmap* bitmap, uint32_t crc);
   unsigned RenameFile(uint32_t oid, const std::string& name);
   unsigned GetFile(uint32_t oid, CVXCatFile& file);
+  // The records of `count` files from `oids` under one hold of the lock, for a caller that
+  // walks many files in turn; codes[i] is what GetFile would answer for oids[i]. Nothing is
+  // logged: the caller asks GetFile again for a file it cannot do without.
+  unsigned GetFiles(const uint32_t* oids, size_t count, std::vector<CVXCatFile>& files,
+                    std::vector<unsigned>& codes);
   unsigned GetFiles(CBitVector& bits);
   unsigned GetFileGroups(uint32_t oid, std::vector<uint32_t>& groups);
   unsigned GetFileGroups(const std::vector<uint32_t>& oids, std::vector<uint32_t>& groups);
@@ -349,6 +358,7 @@ class CVXEngine : public CVXBase {
 
   CQRLLogfile* log_ = nullptr;  // not owned
   bool modified_ = false;
+  std::atomic<uint64_t> changes_{0};
   SVXCreateInfo info_;
   SVXCoreInfo coreInfo_;
   SVXThumbInfoNew thumbInfo_;

@@ -435,6 +435,16 @@ unsigned CVXEngine::GetFile(uint32_t oid, CVXCatFile& file) {
   });
 }
 
+unsigned CVXEngine::GetFiles(const uint32_t* oids, size_t count, std::vector<CVXCatFile>& files,
+                             std::vector<unsigned>& codes) {
+  files.resize(count);
+  codes.resize(count);
+  return Framed_("GetFiles", true, [&] {
+    catalog_.LookupFiles(oids, count, files.data(), codes.data());
+    return VX_OK;
+  });
+}
+
 unsigned CVXEngine::GetFiles(CBitVector& bits) {
   return Framed_("GetFiles", true, [&] { return catalog_.GetFiles(bits); });
 }

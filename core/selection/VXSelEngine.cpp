@@ -27,6 +27,9 @@ constexpr unsigned VX_PLUGIN_PREPARE_FAILED = 13001;
 constexpr size_t kBlockScoringOriginals = 32;
 constexpr size_t kBlockCandidates = 32;
 
+// Candidate records are read this many at a time under one hold of the engine's lock.
+constexpr size_t kFileWindow = kPrefetchBankRecords;
+
 int64_t NowMs() {
   using namespace std::chrono;
   return duration_cast<milliseconds>(steady_clock::now().time_since_epoch()).count();
@@ -123,7 +126,7 @@ unsigned CVXSelEngine::Run(CVXResultSet& result) {
     result_ = VXCodeOfCurrentException(engine_->LogFile(), __LINE__, __FILE__);
   }
   // Clean-up, also after an exception: no reading thread may outlive the buffer.
-  WaitPrefetch();
+  StopPrefetch();
   scorer_.reset();
   shapeBuffer_.reset();
   originalShapes_.clear();
@@ -311,15 +314,20 @@ void CVXSelEngine::MainLoop_(CVXResultSet& result, bool needsShape) {
   if (needsShape && !StartPrefetch(engine_, shapeBuffer_.get(), &candidates_, 0)) {
     VX_ERROR(engine_->LogFile(), VX_UNKNOWN_EXCEPTION, "Prefetch");
   }
-  entryCutOffs_.assign(result.Properties().Entries.size(), 0.0);
+  const auto& entries = result.Properties().Entries;
+  entryCutOffs_.assign(entries.size(), 0.0);
+  // The candidate's location only tells it from an external original, which has no OID.
+  const bool needsUri = std::any_of(entries.begin(), entries.end(),
+                                    [](const SVXResultSetEntry& e) { return e.OID == 0; });
+  fileWindow_.clear();
   StartBlockScoring_(result, needsShape);
   lastPercent_ = 0;
   lastReportMs_ = NowMs();
   for (candidatePos_ = 0; candidatePos_ < candidates_.size() && !aborted_; ++candidatePos_) {
     currentOid_ = candidates_[candidatePos_];
     CVXURI uri;
-    engine_->GetFileURI(currentOid_, uri);
-    if (unsigned rc = engine_->GetFile(currentOid_, currentFile_); rc != VX_OK) {
+    if (needsUri) engine_->GetFileURI(currentOid_, uri);
+    if (unsigned rc = ReadCurrentFile_(); rc != VX_OK) {
       result_ = rc;
       VX_ERROR(engine_->LogFile(), rc, "Selection: reading a candidate");
       return;
@@ -337,6 +345,28 @@ void CVXSelEngine::MainLoop_(CVXResultSet& result, bool needsShape) {
       return;
     }
   }
+}
+
+// The records are read a bank's worth at a time, at the turn of the bank, where the loop waits
+// for the read-ahead thread anyway: taking the engine's lock for every candidate made the loop
+// and that thread trade the lock at every step. A change through the engine (a client may make
+// one from Feedback) has the window read again, so each candidate's record is what GetFile
+// would give at its turn. A file the window lacks is asked for through GetFile, which answers
+// and logs as it does for a lone read.
+unsigned CVXSelEngine::ReadCurrentFile_() {
+  size_t k = candidatePos_ - windowFirst_;
+  if (candidatePos_ < windowFirst_ || k >= fileWindow_.size() ||
+      engine_->Changes() != windowChanges_) {
+    windowFirst_ = candidatePos_;
+    windowChanges_ = engine_->Changes();
+    const size_t count = std::min(kFileWindow, candidates_.size() - candidatePos_);
+    fileCodes_.assign(count, VX_NOT_FOUND);
+    engine_->GetFiles(candidates_.data() + candidatePos_, count, fileWindow_, fileCodes_);
+    k = 0;
+  }
+  if (fileCodes_[k] != VX_OK) return engine_->GetFile(currentOid_, currentFile_);
+  currentFile_ = fileWindow_[k];  // a copy: the window keeps its strings for the next read
+  return VX_OK;
 }
 
 // Sums the workers' scores; false when one of them rejects the candidate.

@@ -112,6 +112,8 @@ class CVXSelEngine : public CVXBase {
   void MakeCandidates_(const CBitVector& candidates, bool needsShape);
   unsigned LoadOrgShapes(CVXResultSet& result);
   void MainLoop_(CVXResultSet& result, bool needsShape);
+  // CurrentFile from the window of candidate records, reading the next window when it is done.
+  unsigned ReadCurrentFile_();
   void ScoreWithoutOriginals_(CVXResultSet& result);
   void ScoreWithOriginals_(CVXResultSet& result, const CVXURI& uri, bool needsShape);
   // The candidate from the scores of its block, with the outcome of ScoreWithOriginals_.
@@ -156,6 +158,11 @@ class CVXSelEngine : public CVXBase {
   CHist currentHist_;
   std::vector<uint32_t> candidates_;
   size_t candidatePos_ = 0;
+  // Records of the candidates from windowFirst_ on, with GetFile's code for each.
+  std::vector<CVXCatFile> fileWindow_;
+  std::vector<unsigned> fileCodes_;
+  size_t windowFirst_ = 0;
+  uint64_t windowChanges_ = 0;  // the engine's Changes() before the window was read
   std::unordered_map<uint32_t, const SVXDBRec_3*> shapeCache_;  // the bank last read
   // The record GetCurrentShapeInfo last gave, for that OID; null after a reset.
   const SVXDBRec_3* currentShape_ = nullptr;

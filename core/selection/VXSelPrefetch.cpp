@@ -27,28 +27,7 @@ namespace {
 
 SPrefetchBlock gPrefetch;  // constructed at library load, signalled
 
-// A block is read in slices of this many records. Each read holds the engine's lock, which the
-// candidate loop takes twice per candidate to read the catalog: a whole block at once would stop
-// the loop for as long as the read lasts, and the two threads would take turns instead of
-// overlapping.
-constexpr size_t kReadSlice = 200;
-
-// Reads the selectors into `bank`, slice by slice; the first failure ends the read.
-unsigned ReadSlices(CVXEngine& engine, const std::vector<CQRLBlobDB::SSelector>& selectors,
-                    uint8_t* bank) {
-  std::vector<CQRLBlobDB::SSelector> slice;
-  for (size_t at = 0; at < selectors.size(); at += kReadSlice) {
-    const size_t end = std::min(selectors.size(), at + kReadSlice);
-    slice.assign(selectors.begin() + static_cast<ptrdiff_t>(at),
-                 selectors.begin() + static_cast<ptrdiff_t>(end));
-    if (unsigned rc = engine.GetShapeData(slice, bank + at * kShapeRecordBytes); rc != VX_OK) {
-      return rc;
-    }
-  }
-  return VX_OK;
-}
-
-// The reading thread: one block of at most 2000 records into the current bank.
+// One block of at most 2000 records into the current bank.
 void ReadBlock() {
   SPrefetchBlock& p = gPrefetch;
   p.Event.Reset();
@@ -57,10 +36,21 @@ void ReadBlock() {
   if (p.Position < candidates.size()) {
     size_t k = std::min(candidates.size() - p.Position, kPrefetchBankRecords);
     for (size_t i = 0; i < k; ++i) p.Selectors.emplace_back(2, candidates[p.Position++]);
-    p.Result = ReadSlices(*p.Engine, p.Selectors, p.Buffer + p.Bank * kPrefetchBankBytes);
+    p.Result = p.Engine->GetShapeData(p.Selectors, p.Buffer + p.Bank * kPrefetchBankBytes);
     if (p.Result != VX_OK) VX_ERROR(p.Engine->LogFile(), p.Result, "Prefetch of shape records");
   }
   p.Event.Set();
+}
+
+// The reading thread: a block for each request until told to stop.
+void Reader() {
+  SPrefetchBlock& p = gPrefetch;
+  for (;;) {
+    p.Request.Wait();
+    p.Request.Reset();
+    if (p.Stop) return;
+    ReadBlock();
+  }
 }
 
 }  // namespace
@@ -70,7 +60,6 @@ SPrefetchBlock& Prefetch() { return gPrefetch; }
 bool StartPrefetch(CVXEngine* engine, uint8_t* buffer, const std::vector<uint32_t>* candidates,
                    size_t position) {
   SPrefetchBlock& p = gPrefetch;
-  if (p.Reader.joinable()) p.Reader.join();  // it has signalled: the caller waited
   p.Bank = (p.Bank - 1) & 1;
   p.Engine = engine;
   p.Buffer = buffer;
@@ -78,19 +67,29 @@ bool StartPrefetch(CVXEngine* engine, uint8_t* buffer, const std::vector<uint32_
   p.Position = position;
   p.Result = VX_OK;
   p.Event.Reset();
-  try {
-    p.Reader = std::thread(ReadBlock);
-  } catch (const std::system_error&) {
-    p.Result = VX_UNKNOWN_EXCEPTION;
-    p.Position = candidates->size();
-    p.Event.Set();
-    return false;
+  if (!p.Reader.joinable()) {
+    p.Stop = false;
+    try {
+      p.Reader = std::thread(Reader);
+    } catch (const std::system_error&) {
+      p.Result = VX_UNKNOWN_EXCEPTION;
+      p.Position = candidates->size();
+      p.Event.Set();
+      return false;
+    }
   }
+  p.Request.Set();
   return true;
 }
 
-void WaitPrefetch() {
+void WaitPrefetch() { gPrefetch.Event.Wait(); }
+
+void StopPrefetch() {
   SPrefetchBlock& p = gPrefetch;
   p.Event.Wait();
-  if (p.Reader.joinable()) p.Reader.join();
+  if (!p.Reader.joinable()) return;
+  p.Stop = true;
+  p.Request.Set();
+  p.Reader.join();
+  p.Request.Reset();
 }

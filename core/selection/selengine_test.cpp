@@ -274,7 +274,8 @@ TEST_F(SelEngineTest, ExternalOriginalsComeFromTheClient) {
 
 // Bad input ends the run with a code and an empty result, never with a crash: an original
 // that the client cannot deliver, one without OID that no client override supplies, a
-// candidate whose shape record is missing, a feature blob cut short.
+// candidate that the client removes while the run walks the candidates, a candidate whose shape
+// record is missing, a feature blob cut short.
 TEST_F(SelEngineTest, BadInputGivesItsCode) {
   AddFiles(30, 4);
   const Events failedTail = {{State::Progress, 100}, {State::Failed, 0}, {State::Finished, 0}};
@@ -299,6 +300,20 @@ TEST_F(SelEngineTest, BadInputGivesItsCode) {
     SCOPED_TRACE("no client for files outside the catalog");
     RecordingSelEngine run(&engine_);
     expectFailure(run, {{0, 0, CVXURI("file:///x/y.jpg", false)}}, VX_NO_FILE_OID);
+  }
+  {
+    SCOPED_TRACE("a candidate removed during the run");
+    RecordingSelEngine run(&engine_);
+    // After the first candidate, whose turn read the records of all 30 ahead.
+    run.refuse = [&](const Events& events) {
+      if (events.back() == std::make_pair(State::Progress, 0ul) &&
+          std::count(events.begin(), events.end(), std::make_pair(State::PreselectEnd, 30ul)) &&
+          engine_.GetFile(oids_[25], *std::make_unique<CVXCatFile>()) == VX_OK) {
+        EXPECT_EQ(engine_.RemoveFile(oids_[25]), VX_OK);
+      }
+      return false;
+    };
+    expectFailure(run, Originals(1), VX_NOT_FOUND);
   }
   {
     SCOPED_TRACE("a candidate without shape record");
