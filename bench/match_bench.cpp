@@ -208,6 +208,22 @@ void BM_Prepared(benchmark::State& state) {
 }
 BENCHMARK(BM_Prepared)->Arg(kRecords)->Arg(kCached);
 
+// The same comparisons through MatchCSQuickPreparedMany, one original against all candidates.
+void BM_PreparedMany(benchmark::State& state) {
+  const SVXMatchParams p = Params(false, false, 0);
+  std::vector<SVXQuickCells> prepared;
+  for (int r = 0; r < state.range(0); ++r) prepared.push_back(PrepareQuick(Record(r), false));
+  std::vector<const SVXQuickCells*> candidates;
+  for (const SVXQuickCells& c : prepared) candidates.push_back(&c);
+  std::vector<double> scores(prepared.size());
+  for (auto _ : state) {
+    MatchCSQuickPreparedMany(prepared[0], candidates.data(), candidates.size(), p, scores.data());
+    benchmark::DoNotOptimize(scores.data());
+  }
+  Count(state);
+}
+BENCHMARK(BM_PreparedMany)->Arg(kRecords)->Arg(kCached);
+
 }  // namespace
 
 BENCHMARK_MAIN();

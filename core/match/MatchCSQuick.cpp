@@ -132,6 +132,39 @@ double MatchCSQuick(const SVXDBRec_3& o, const SVXDBRec_3& c, const SVXMatchPara
   return kernels.Pick(p)(vxmatch::CellBytes(o), vxmatch::CellBytes(c), p);
 }
 
+namespace {
+
+// The visited sums of o and of c added.
+vxmatch::SFieldSums BothSums(const SVXQuickCells& o, const SVXQuickCells& c) {
+  vxmatch::SFieldSums both;
+  both.Luma = o.Luma + c.Luma;
+  both.Color = o.Color + c.Color;
+  both.Shape = o.Shape + c.Shape;
+  return both;
+}
+
+}  // namespace
+
+void MatchCSQuickPreparedMany(const SVXQuickCells& o, const SVXQuickCells* const* c, size_t count,
+                              const SVXMatchParams& p, double* scores) {
+  static const vxmatch::Minima4Fn minima4 = vxmatch::Avx512PreparedMinima4();
+  size_t j = 0;
+  if (minima4) {
+    const double norm = vxmatch::PlainNorm(p);
+    for (; j + 4 <= count; j += 4) {
+      const uint8_t* cells[4];
+      for (int k = 0; k < 4; ++k) cells[k] = vxmatch::CellBytes(*c[j + k]->Record);
+      vxmatch::SFieldSums minima[4];
+      minima4(vxmatch::CellBytes(*o.Record), cells, p.Fast, minima);
+      for (int k = 0; k < 4; ++k) {
+        const vxmatch::SFieldSums both = BothSums(o, *c[j + k]);
+        scores[j + k] = vxmatch::Score(norm, vxmatch::Differences(both, minima[k]).Total(p));
+      }
+    }
+  }
+  for (; j < count; ++j) scores[j] = MatchCSQuickPrepared(o, *c[j], p);
+}
+
 SVXQuickCells PrepareQuick(const SVXDBRec_3& r, bool fast) {
   const vxmatch::SFieldSums sums = vxmatch::VisitedSums(vxmatch::CellBytes(r), fast ? 2 : 1);
   return {&r, sums.Luma, sums.Color, sums.Shape};
@@ -143,9 +176,5 @@ double MatchCSQuickPrepared(const SVXQuickCells& o, const SVXQuickCells& c,
       vxmatch::Avx512PreparedQuick() ? vxmatch::Avx512PreparedQuick()
       : vxmatch::Avx2PreparedQuick() ? vxmatch::Avx2PreparedQuick()
                                      : vxmatch::PortablePreparedQuick();
-  vxmatch::SFieldSums both;
-  both.Luma = o.Luma + c.Luma;
-  both.Color = o.Color + c.Color;
-  both.Shape = o.Shape + c.Shape;
-  return kernel(vxmatch::CellBytes(*o.Record), vxmatch::CellBytes(*c.Record), both, p);
+  return kernel(vxmatch::CellBytes(*o.Record), vxmatch::CellBytes(*c.Record), BothSums(o, c), p);
 }

@@ -53,6 +53,11 @@ PreparedFn Avx2PreparedQuick();
 // processor have AVX-512BW.
 KernelFn Avx512PlainQuick();
 PreparedFn Avx512PreparedQuick();
+// The minima sums of o against four candidates at once, for MatchCSQuickPreparedMany; null
+// unless both the build and the processor have AVX-512BW.
+using Minima4Fn = void (*)(const uint8_t* o, const uint8_t* const c[4], bool fast,
+                           SFieldSums minima[4]);
+Minima4Fn Avx512PreparedMinima4();
 
 // MatchCSQuick. Each kernel reads Fast once and runs a loop made for it.
 const SKernelSet& PortableQuickKernels();

@@ -58,6 +58,34 @@ VX_AVX512 inline SFieldSums SumChunks(const uint8_t* o, const uint8_t* c) {
   return Reduce({Folded(all), Folded(high)});
 }
 
+// The minima sums of o against four candidates: o's chunk is read once for the four, and the
+// four independent sums keep the core busy while each waits on its last addition.
+template <bool kFast>
+VX_AVX512 inline void MinimaOfFour(const uint8_t* o, const uint8_t* const c[4],
+                                   SFieldSums minima[4]) {
+  __m512i all[4], high[4];
+  for (int k = 0; k < 4; ++k) all[k] = high[k] = _mm512_setzero_si512();
+  for (int v = 0; v < 25; ++v) {
+    const __mmask64 keep = kFast ? kFastMasks.Bytes[v % 5] : ~__mmask64{0};
+    const __m512i x = _mm512_loadu_si512(o + 64 * v);
+    for (int k = 0; k < 4; ++k) {
+      const __m512i bytes = MaskedMin(keep, x, _mm512_loadu_si512(c[k] + 64 * v));
+      all[k] = _mm512_add_epi16(all[k], bytes);
+      high[k] = _mm512_add_epi16(high[k], _mm512_srli_epi16(bytes, 8));
+    }
+  }
+  for (int k = 0; k < 4; ++k) minima[k] = Reduce({Folded(all[k]), Folded(high[k])});
+}
+
+VX_AVX512 void Minima4(const uint8_t* o, const uint8_t* const c[4], bool fast,
+                       SFieldSums minima[4]) {
+  if (fast) {
+    MinimaOfFour<true>(o, c, minima);
+  } else {
+    MinimaOfFour<false>(o, c, minima);
+  }
+}
+
 template <__m512i (*kChunk)(__mmask64, __m512i, __m512i)>
 VX_AVX512 SFieldSums Sums(const uint8_t* o, const uint8_t* c, bool fast) {
   return fast ? SumChunks<true, kChunk>(o, c) : SumChunks<false, kChunk>(o, c);
@@ -86,11 +114,13 @@ bool CpuHasAvx512() {
 
 KernelFn Avx512PlainQuick() { return CpuHasAvx512() ? Plain : nullptr; }
 PreparedFn Avx512PreparedQuick() { return CpuHasAvx512() ? Prepared : nullptr; }
+Minima4Fn Avx512PreparedMinima4() { return CpuHasAvx512() ? Minima4 : nullptr; }
 
 #else
 
 KernelFn Avx512PlainQuick() { return nullptr; }
 PreparedFn Avx512PreparedQuick() { return nullptr; }
+Minima4Fn Avx512PreparedMinima4() { return nullptr; }
 
 #endif
 

@@ -4,6 +4,7 @@
 // similarity from 0 to 100, higher being closer. They read nothing but their arguments and
 // allocate nothing, so one selection worker can call them per candidate and original.
 
+#include <cstddef>
 #include <cstdint>
 
 #include "Hist.h"
@@ -60,6 +61,10 @@ SVXQuickCells PrepareQuick(const SVXDBRec_3& r, bool fast);
 // many times: since |x - y| = x + y - 2 min(x, y), the comparison itself sums only the minima.
 double MatchCSQuickPrepared(const SVXQuickCells& o, const SVXQuickCells& c,
                             const SVXMatchParams& p);
+// MatchCSQuickPrepared of o against each of `count` candidates, into scores[j], to the bit. One
+// original against many at once reads the original once for several candidates.
+void MatchCSQuickPreparedMany(const SVXQuickCells& o, const SVXQuickCells* const* c, size_t count,
+                              const SVXMatchParams& p, double* scores);
 
 // As MatchCSQuick, but a cell whose colour is too far off may match a neighbour of the
 // candidate's cell at a price. The norm is never weighted, so weights above 1 can bring the score

@@ -384,6 +384,30 @@ TEST(MatchKernels, PreparedQuickAtTheByteExtremes) {
   }
 }
 
+// One original against many, in groups of four and a remainder, gives each pair's score to the
+// bit; near candidates keep the scores away from 0.
+TEST(MatchKernels, PreparedManyAgreesPairByPair) {
+  std::mt19937 rng(21);
+  const Rec o = Uniform(rng);
+  std::vector<Rec> records;
+  for (int j = 0; j < 11; ++j) records.push_back(j % 2 ? Uniform(rng) : Near(o, rng, 20));
+  for (bool fast : {false, true}) {
+    SVXMatchParams p;
+    p.SetWeights(30, 25);
+    p.Fast = fast;
+    const SVXQuickCells po = PrepareQuick(o, fast);
+    std::vector<SVXQuickCells> prepared;
+    for (const Rec& r : records) prepared.push_back(PrepareQuick(r, fast));
+    std::vector<const SVXQuickCells*> candidates;
+    for (const SVXQuickCells& c : prepared) candidates.push_back(&c);
+    std::vector<double> scores(records.size(), -1);
+    MatchCSQuickPreparedMany(po, candidates.data(), candidates.size(), p, scores.data());
+    for (size_t j = 0; j < records.size(); ++j) {
+      EXPECT_EQ(MatchCSQuick(o, records[j], p), scores[j]) << "fast " << fast << " candidate " << j;
+    }
+  }
+}
+
 TEST(MatchKernels, AllZeroMaskLeavesQuickWithoutNorm) {
   SVXWeightMatrix w;
   const uint8_t zeros[400] = {};

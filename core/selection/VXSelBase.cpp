@@ -540,10 +540,21 @@ void CVXSelBase::ScoreShapes(const SPreparedShape& original, const SPreparedShap
   const bool gated = Limits.Active && Limits.Mode == 1;
   const bool prepared = QuickPrepared_();
   const SVXMatchParams params = MatchParams_();
+  // The match scores first, in scores; then each in its place among the rows.
+  if (prepared) {
+    constexpr size_t kAtOnce = 64;
+    const SVXQuickCells* quick[kAtOnce];
+    for (size_t at = 0; at < count; at += kAtOnce) {
+      const size_t m = std::min(kAtOnce, count - at);
+      for (size_t j = 0; j < m; ++j) quick[j] = &candidates[at + j].Quick;
+      MatchCSQuickPreparedMany(original.Quick, quick, m, params, scores + at);
+    }
+  } else {
+    for (size_t j = 0; j < count; ++j)
+      scores[j] = MatchWithoutHistogram_(*original.Record, *candidates[j].Record);
+  }
   for (size_t j = 0; j < count; ++j) {
-    const double match = prepared
-                             ? MatchCSQuickPrepared(original.Quick, candidates[j].Quick, params)
-                             : MatchWithoutHistogram_(*original.Record, *candidates[j].Record);
+    const double match = scores[j];
     passed[j] = !(gated && match < Limits.MinScore);
     scores[j] = (constant + match) / rows;
   }

@@ -20,12 +20,17 @@ CVXSelBlockScorer::~CVXSelBlockScorer() {
   for (std::thread& helper : helpers_) helper.join();
 }
 
-void CVXSelBlockScorer::ScoreBlock(const std::vector<const SVXDBRec_3*>& candidates) {
+void CVXSelBlockScorer::ScoreBlock(const std::vector<const SVXDBRec_3*>& candidates,
+                                   const std::vector<double>& floors) {
   candidates_.resize(candidates.size());
   for (size_t b = 0; b < candidates.size(); ++b)
     worker_.PrepareShape(*candidates[b], candidates_[b]);
-  scores_.resize(candidates_.size() * originals_.size());
-  passed_.resize(scores_.size());
+  floors_ = floors.empty() ? nullptr : &floors;
+  passes_.resize(parts_);
+  for (auto& part : passes_) {
+    part.resize(candidates_.size());
+    for (auto& passes : part) passes.clear();
+  }
   {
     std::lock_guard<std::mutex> hold(mutex_);
     ++generation_;
@@ -58,11 +63,14 @@ void CVXSelBlockScorer::ScorePart_(unsigned part) {
   const size_t m = candidates_.size();
   std::vector<double> scores(m);
   std::vector<uint8_t> passed(m);
+  std::vector<std::vector<SPass>>& passes = passes_[part];
   for (size_t i = first; i < end; ++i) {
     worker_.ScoreShapes(originals_[i], candidates_.data(), m, scores.data(), passed.data());
+    const double floor = floors_ ? (*floors_)[i] : 0.0;
     for (size_t b = 0; b < m; ++b) {
-      scores_[b * n + i] = scores[b];
-      passed_[b * n + i] = passed[b];
+      // The caller's test in the same form, so that a score that is not a number fails here too.
+      if (passed[b] && scores[b] >= floor)
+        passes[b].push_back({static_cast<uint32_t>(i), scores[b]});
     }
   }
 }

@@ -27,14 +27,28 @@ class CVXSelBlockScorer {
   CVXSelBlockScorer& operator=(const CVXSelBlockScorer&) = delete;
   ~CVXSelBlockScorer();
 
+  // A pair of a candidate and an original that Check would pass with a cut-off of 0 and whose
+  // score reached the original's floor.
+  struct SPass {
+    uint32_t Original;
+    double Score;
+  };
+
   // Scores `candidates` against every original; their results replace the last block's.
-  void ScoreBlock(const std::vector<const SVXDBRec_3*>& candidates);
+  // `floors` holds one score per original below which the caller has no use for a pair; empty
+  // means no floor.
+  void ScoreBlock(const std::vector<const SVXDBRec_3*>& candidates,
+                  const std::vector<double>& floors);
 
   size_t Candidates() const { return candidates_.size(); }
   const SVXDBRec_3* Candidate(size_t b) const { return candidates_[b].Record; }
-  // The verdict of the worker on candidate b and original i, before any cut-off.
-  bool Passed(size_t b, size_t i) const { return passed_[b * originals_.size() + i] != 0; }
-  double Score(size_t b, size_t i) const { return scores_[b * originals_.size() + i]; }
+  // Calls f(pass) for the passes of candidate b, by ascending original.
+  template <typename F>
+  void ForEachPass(size_t b, F f) const {
+    for (const auto& part : passes_) {
+      for (const SPass& pass : part[b]) f(pass);
+    }
+  }
 
  private:
   void Helper_(unsigned part);
@@ -44,8 +58,9 @@ class CVXSelBlockScorer {
   const CVXSelBase& worker_;
   std::vector<CVXSelBase::SPreparedShape> originals_;
   std::vector<CVXSelBase::SPreparedShape> candidates_;
-  std::vector<double> scores_;   // original-major
-  std::vector<uint8_t> passed_;  // likewise
+  const std::vector<double>* floors_ = nullptr;  // during ScoreBlock
+  // passes_[part][b]: the passes of candidate b among the originals of that part.
+  std::vector<std::vector<std::vector<SPass>>> passes_;
   unsigned parts_;
 
   std::mutex mutex_;

@@ -472,16 +472,22 @@ void CVXSelEngine::ScoreBlock_(const SVXDBRec_3* shape) {
     if (it == shapeCache_.end()) break;
     block.push_back(it->second);
   }
-  scorer_->ScoreBlock(block);
+  // Once in force, a running cut-off only rises: Check passes no sum below it, and ResultCutOff
+  // keeps the best of hits that all reached it (scores by shapes alone never exceed 100, so it
+  // never rescales). So today's cut-offs are floors for the whole block, unless the grey-scale
+  // penalty may lower a sum after Check and with it the cut-off.
+  const bool penalty = fileFormat_.Active && fileFormat_.GrayScaleMode == 1;
+  static const std::vector<double> kNoFloors;
+  scorer_->ScoreBlock(block, cutOffInForce_ && !penalty ? entryCutOffs_ : kNoFloors);
   blockFirst_ = candidatePos_;
 }
 
 void CVXSelEngine::ScoreFromBlock_(CVXResultSet& result, const CVXURI& uri) {
   auto& entries = result.Properties().Entries;
   const size_t n = entries.size();
-  size_t i = 0;
-  while (i < n && IsCandidate_(entries[i], uri)) ++i;
-  if (i < n) {
+  size_t first = 0;
+  while (first < n && IsCandidate_(entries[first], uri)) ++first;
+  if (first < n) {
     // Where Check would first have asked for the candidate's record.
     const SVXDBRec_3* shape = GetCurrentShapeInfo();
     size_t b = candidatePos_ - blockFirst_;
@@ -490,12 +496,13 @@ void CVXSelEngine::ScoreFromBlock_(CVXResultSet& result, const CVXURI& uri) {
       ScoreBlock_(shape);
       b = 0;
     }
-    for (; i < n; ++i) {
-      if (!scorer_->Passed(b, i)) continue;
-      const double sum = scorer_->Score(b, i);
-      if (!(sum >= MinScoreOf_(i)) || !EnterEntry_(entries, i, uri, true)) continue;
-      AddHit_(entries[i], i, sum);
-    }
+    scorer_->ForEachPass(b, [&](const CVXSelBlockScorer::SPass& pass) {
+      const size_t i = pass.Original;
+      if (i < first || !(pass.Score >= MinScoreOf_(i)) || !EnterEntry_(entries, i, uri, true)) {
+        return;
+      }
+      AddHit_(entries[i], i, pass.Score);
+    });
   }
   // The walk over the entries ends at the last one.
   EnterEntry_(entries, n - 1, uri, true);
