@@ -3,6 +3,7 @@
 #include <cmath>
 #include <map>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 #include "Hist.h"
@@ -11,6 +12,7 @@
 #include "VXSelBase.h"
 #include "VXSelEngine.h"
 #include "VXSelector.h"
+#include "seltest_util.h"
 #include "vxengine_fixture.h"
 
 // The worker is exercised through real runs on a small catalog: the hits of a run and their
@@ -19,34 +21,35 @@
 namespace {
 
 using Hits = std::map<std::string, double>;  // file name to score
+using Names = std::vector<std::string>;
 
 template <typename T>
 T Feature() {
-  T record;
-  record.Reset();
+  T record = seltest::Fresh<T>();
   record.Active = true;
   return record;
 }
 
-template <typename T>
-void Put(CVXSelector& selector, T record) {
-  CVXMemFile blob;
-  record.Store(&blob, true);
-  selector.SetFeature(T::kKey, blob);
+SSelProps Prop(const std::string& column, uint32_t type) {
+  auto p = Feature<SSelProps>();
+  p.Table = "Image Properties", p.Column = column, p.DataType = type;
+  return p;
 }
 
-void Put(CVXSelector& selector, SSelProps record) {
-  CVXMemFile blob;
-  record.Store(&blob, true);
-  selector.SetFeature(SSelProps::GenerateID(record.Table, record.Column), blob);
+template <typename T>
+void Put(CVXSelector& selector, const T& record) {
+  if constexpr (std::is_same_v<T, SSelProps>) {
+    selector.SetFeature(SSelProps::GenerateID(record.Table, record.Column), seltest::Blob(record));
+  } else {
+    selector.SetFeature(T::kKey, seltest::Blob(record));
+  }
 }
 
 // Limits that keep every hit, so the checks' own scores show; a later SSelLimits replaces them.
 template <typename... T>
 CVXSelector Make(const T&... records) {
   CVXSelector selector;
-  SSelLimits open;
-  open.Reset();
+  auto open = seltest::Fresh<SSelLimits>();
   open.Mode = 0;
   Put(selector, open);
   (Put(selector, records), ...);
@@ -59,7 +62,7 @@ SVXDBRec_3 Uniform(uint8_t c1, uint8_t c2, uint8_t c3) {
   return shape;
 }
 
-struct FileSpec {
+struct FileInfo {
   std::string name;
   uint32_t w = 400, h = 300, size = 1000, format = 1;
   int32_t time = 0;
@@ -75,15 +78,11 @@ class SelBaseTest : public vxtest::EngineFixture {
     pics_ = AddFolder("/pics/");
   }
 
-  uint32_t Add(const FileSpec& f) {
+  uint32_t Add(const FileInfo& f) {
     CVXCatFile file(0, f.name, f.folder ? f.folder : pics_);
     CVXCatFile::SData& p = file.Properties();
-    p.Width = f.w;
-    p.Height = f.h;
-    p.Size = f.size;
-    p.Format = f.format;
-    p.EmbeddedTime = f.time;
-    p.Flags = f.grey ? cfGreyscale : 0;
+    p.Width = f.w, p.Height = f.h, p.Size = f.size, p.Format = f.format;
+    p.EmbeddedTime = f.time, p.Flags = f.grey ? cfGreyscale : 0;
     CVXThumb thumb = vxtest::MakeThumb(4, 4, 16, 1);
     EXPECT_EQ(engine_.AddFile(file, thumb, f.shape), VX_OK) << f.name;
     names_[file.Oid()] = f.name;
@@ -92,7 +91,7 @@ class SelBaseTest : public vxtest::EngineFixture {
   }
 
   // The hits of all entries of a run against the named originals (none: a run without).
-  Hits Run(CVXSelector selector, const std::vector<std::string>& originals = {}) {
+  Hits Run(CVXSelector selector, const Names& originals = {}) {
     std::vector<SVXFileDescriptor> descriptors;
     for (const auto& name : originals) descriptors.push_back({oids_.at(name), pics_, CVXURI()});
     selector.Properties().NeedsOriginals = !originals.empty();
@@ -107,9 +106,10 @@ class SelBaseTest : public vxtest::EngineFixture {
     return hits;
   }
 
-  std::vector<std::string> HitNames(const Hits& hits) {
-    std::vector<std::string> names;
-    for (const auto& hit : hits) names.push_back(hit.first);
+  // The names of the hits only.
+  Names Found(CVXSelector selector, const Names& originals = {}) {
+    Names names;
+    for (const auto& hit : Run(std::move(selector), originals)) names.push_back(hit.first);
     return names;
   }
 
@@ -118,14 +118,11 @@ class SelBaseTest : public vxtest::EngineFixture {
   std::map<std::string, uint32_t> oids_;
 };
 
-using Names = std::vector<std::string>;
-
 // Same names, scores equal but for rounding.
 ::testing::AssertionResult Same(const Hits& got, const Hits& want) {
   bool ok = got.size() == want.size();
   for (const auto& [name, score] : want) {
-    auto it = got.find(name);
-    ok = ok && it != got.end() && std::fabs(it->second - score) < 1e-9;
+    ok = ok && got.count(name) && std::fabs(got.at(name) - score) < 1e-9;
   }
   if (ok) return ::testing::AssertionSuccess();
   std::string text;
@@ -152,12 +149,8 @@ TEST_F(SelBaseTest, ScoresAverageOverFeaturesAndTheGateRejectsEarly) {
   // With the gate, a candidate below MinScore never reaches the later checks: the property
   // check, last in line, reads a row only for the two that pass.
   limits.Mode = 1;
-  auto props = Feature<SSelProps>();
-  props.Table = "Image Properties";
-  props.Column = "n";
-  props.DataType = vptUInt32;
-  props.MatchEmpty = true;
-  props.Conditions[0].High = CVXProperty(100u);
+  auto props = Prop("n", vptUInt32);
+  props.MatchEmpty = true, props.Conditions[0].High = CVXProperty(100u);
   CVXTable table(VX_IMAGE_PROPERTIES_TABLE);
   table.Properties().Name = "Image Properties";
   table.AddColumn("n", vptUInt32);
@@ -190,30 +183,29 @@ TEST_F(SelBaseTest, FormatsByListOrOriginalsWithTheGreyScaleRules) {
 
 TEST_F(SelBaseTest, CategoriesByListOriginalsOrActiveCategory) {
   for (const char* name : {"a", "b", "c", "d"}) Add({.name = name});
-  CVXGroup g1, g2;
-  g1.Name() = "g1";
-  g1.Images().Set(oids_["a"]);
-  g1.Images().Set(oids_["b"]);
-  g2.Name() = "g2";
-  g2.Images().Set(oids_["b"]);
-  g2.Images().Set(oids_["c"]);
-  ASSERT_EQ(engine_.AddGroup(g1), VX_OK);
-  ASSERT_EQ(engine_.AddGroup(g2), VX_OK);
+  auto group = [&](const char* name, const Names& files) {
+    CVXGroup g;
+    g.Name() = name;
+    for (const auto& file : files) g.Images().Set(oids_[file]);
+    EXPECT_EQ(engine_.AddGroup(g), VX_OK) << name;
+    return g.Oid();
+  };
+  const uint32_t g1 = group("g1", {"a", "b"}), g2 = group("g2", {"b", "c"});
   auto cats = Feature<SSelCategories>();
   cats.Mode = 1;
-  EXPECT_EQ(HitNames(Run(Make(cats))), (Names{"a", "b", "c", "d"}));  // empty list: no effect
-  cats.Categories = {g1.Oid(), g2.Oid()};
-  EXPECT_EQ(HitNames(Run(Make(cats))), (Names{"a", "b", "c"}));
+  EXPECT_EQ(Found(Make(cats)), (Names{"a", "b", "c", "d"}));  // empty list: no effect
+  cats.Categories = {g1, g2};
+  EXPECT_EQ(Found(Make(cats)), (Names{"a", "b", "c"}));
   cats.Op = 1;
-  EXPECT_EQ(HitNames(Run(Make(cats))), (Names{"b"}));
+  EXPECT_EQ(Found(Make(cats)), (Names{"b"}));
   cats.Mode = 0;  // the categories of the originals
-  EXPECT_EQ(HitNames(Run(Make(cats), {"a"})), (Names{"b"}));
-  EXPECT_EQ(HitNames(Run(Make(cats), {"d"})), (Names{"a", "b", "c"}));
+  EXPECT_EQ(Found(Make(cats), {"a"}), (Names{"b"}));
+  EXPECT_EQ(Found(Make(cats), {"d"}), (Names{"a", "b", "c"}));
   cats.Mode = 2;
   CVXSelector selector = Make(cats);
-  EXPECT_EQ(HitNames(Run(selector)), (Names{"a", "b", "c", "d"}));
-  selector.Properties().ActiveCategory = g2.Oid();
-  EXPECT_EQ(HitNames(Run(selector)), (Names{"b", "c"}));
+  EXPECT_EQ(Found(selector), (Names{"a", "b", "c", "d"}));
+  selector.Properties().ActiveCategory = g2;
+  EXPECT_EQ(Found(selector), (Names{"b", "c"}));
 }
 
 TEST_F(SelBaseTest, FoldersByListOrActiveFolder) {
@@ -225,16 +217,16 @@ TEST_F(SelBaseTest, FoldersByListOrActiveFolder) {
   folders.Mode = 1;
   EXPECT_TRUE(Run(Make(folders)).empty());  // an empty list leaves no candidate
   folders.Folders = {pics_, other};
-  EXPECT_EQ(HitNames(Run(Make(folders))), (Names{"a", "x"}));
+  EXPECT_EQ(Found(Make(folders)), (Names{"a", "x"}));
   folders.Recursive = 1;
-  EXPECT_EQ(HitNames(Run(Make(folders))), (Names{"a", "s", "x"}));
+  EXPECT_EQ(Found(Make(folders)), (Names{"a", "s", "x"}));
   folders.Op = 1;
   EXPECT_TRUE(Run(Make(folders)).empty());
   folders.Mode = 0;
   CVXSelector selector = Make(folders);
-  EXPECT_EQ(HitNames(Run(selector)), (Names{"a", "s", "x"}));
+  EXPECT_EQ(Found(selector), (Names{"a", "s", "x"}));
   selector.Properties().ActiveFolder = pics_;
-  EXPECT_EQ(HitNames(Run(selector)), (Names{"a", "s"}));
+  EXPECT_EQ(Found(selector), (Names{"a", "s"}));
 }
 
 TEST_F(SelBaseTest, XMPQueryKeepsOrRemovesItsFiles) {
@@ -243,14 +235,12 @@ TEST_F(SelBaseTest, XMPQueryKeepsOrRemovesItsFiles) {
   ASSERT_EQ(engine_.SetXMPFTI(a, {{"dc:subject", "beach sun"}}), VX_OK);
   ASSERT_EQ(engine_.SetXMPFTI(b, {{"dc:title", "beach"}}), VX_OK);
   auto xmp = Feature<SSelXMP>();
-  xmp.Query = "beach";
-  xmp.Flag = true;
-  EXPECT_EQ(HitNames(Run(Make(xmp))), (Names{"a", "b"}));
-  xmp.UseField = 1;
-  xmp.Field = "dc:subject";
-  EXPECT_EQ(HitNames(Run(Make(xmp))), (Names{"a"}));
+  xmp.Query = "beach", xmp.Flag = true;
+  EXPECT_EQ(Found(Make(xmp)), (Names{"a", "b"}));
+  xmp.UseField = 1, xmp.Field = "dc:subject";
+  EXPECT_EQ(Found(Make(xmp)), (Names{"a"}));
   xmp.Exclude = 1;
-  EXPECT_EQ(HitNames(Run(Make(xmp))), (Names{"b", "c"}));
+  EXPECT_EQ(Found(Make(xmp)), (Names{"b", "c"}));
 }
 
 // ---- Dimensions and orientation
@@ -263,27 +253,24 @@ TEST_F(SelBaseTest, DimensionsRelativeAbsoluteAndByOrientation) {
   Add({.name = "wide", .w = 800, .h = 450});
   auto dim = Feature<SSelDimensions>();
   // Orientation 0, relative: the originals are all landscape, so portraits go before the loop.
-  EXPECT_EQ(HitNames(Run(Make(dim), {"o"})), (Names{"near", "square", "wide"}));
-  EXPECT_EQ(HitNames(Run(Make(dim), {"tall"})), (Names{"square"}));
+  EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"near", "square", "wide"}));
+  EXPECT_EQ(Found(Make(dim), {"tall"}), (Names{"square"}));
   EXPECT_EQ(Run(Make(dim), {"o", "tall"}).size(), 5u);  // mixed: no cut
   dim.TolerancePercent = 100;  // two-sided score stays 100 up to a sum of 100 %
   EXPECT_TRUE(Same(Run(Make(dim), {"o"}), {{"near", 100}, {"square", 100}, {"wide", 50}}));
-  dim.TolerancePercent = 30;
-  dim.SubMode = 1;
+  dim.TolerancePercent = 30, dim.SubMode = 1;
   EXPECT_TRUE(Same(Run(Make(dim), {"o"}), {{"near", 90}, {"square", 75}}));
   dim.SubMode = 2;
   EXPECT_TRUE(Same(Run(Make(dim), {"o"}), {{"near", 90}, {"square", 100}}));
 
-  dim.Mode = 1;
-  dim.MinWidth = 350;
-  EXPECT_EQ(HitNames(Run(Make(dim), {"o"})), (Names{"near", "tall", "wide"}));
+  dim.Mode = 1, dim.MinWidth = 350;
+  EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"near", "tall", "wide"}));
   dim.Orientation = 1;  // as the original
-  EXPECT_EQ(HitNames(Run(Make(dim), {"o"})), (Names{"near", "wide"}));
-  dim.MinWidth = 0;
-  dim.Orientation = 3;
-  EXPECT_EQ(HitNames(Run(Make(dim), {"o"})), (Names{"square", "tall"}));
+  EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"near", "wide"}));
+  dim.MinWidth = 0, dim.Orientation = 3;
+  EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"square", "tall"}));
   dim.Orientation = 2;
-  EXPECT_EQ(HitNames(Run(Make(dim), {"o"})), (Names{"near", "square", "wide"}));
+  EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"near", "square", "wide"}));
 }
 
 // ---- Size, date and name
@@ -296,10 +283,8 @@ TEST_F(SelBaseTest, FileSizeRelativeScoresAndAbsoluteBoundsInclusive) {
   Add({.name = "over", .size = 204801});
   auto size = Feature<SSelFileSize>();
   EXPECT_TRUE(Same(Run(Make(size), {"o"}), {{"smaller", 95}, {"lo", 98}}));
-  size.Mode = 1;
-  size.MinKB = 100;
-  size.MaxKB = 200;
-  EXPECT_EQ(HitNames(Run(Make(size))), (Names{"hi", "lo"}));
+  size.Mode = 1, size.MinKB = 100, size.MaxKB = 200;
+  EXPECT_EQ(Found(Make(size)), (Names{"hi", "lo"}));
   size.Mode = 2;
   EXPECT_TRUE(Run(Make(size)).empty());
 }
@@ -323,16 +308,11 @@ TEST_F(SelBaseTest, DateTimeRangesRelationsAndDistances) {
       {3, 0, 0, 0, {}},
   };
   for (const Case& c : cases) {
-    dt.Relation = c.relation;
-    dt.Amount = c.amount;
-    dt.Unit = c.unit;
-    dt.Direction = c.direction;
-    EXPECT_EQ(HitNames(Run(Make(dt), {"o"})), c.hits) << c.relation << c.amount << c.unit;
+    dt.Relation = c.relation, dt.Amount = c.amount, dt.Unit = c.unit, dt.Direction = c.direction;
+    EXPECT_EQ(Found(Make(dt), {"o"}), c.hits) << c.relation << c.amount << c.unit;
   }
-  dt.Mode = 1;
-  dt.From = t0 - 3 * day;
-  dt.To = t0 + 10 * day;
-  EXPECT_EQ(HitNames(Run(Make(dt))), (Names{"m1", "m3", "o", "p10"}));
+  dt.Mode = 1, dt.From = t0 - 3 * day, dt.To = t0 + 10 * day;
+  EXPECT_EQ(Found(Make(dt)), (Names{"m1", "m3", "o", "p10"}));
 }
 
 TEST_F(SelBaseTest, FileNameModesAndInvert) {
@@ -350,18 +330,15 @@ TEST_F(SelBaseTest, FileNameModesAndInvert) {
   name.Invert = 1;
   EXPECT_TRUE(Run(Make(name), {"img1.jpg"}).empty());
 
-  name.Invert = 0;
-  name.Mode = 2;
+  name.Invert = 0, name.Mode = 2,
   name.Pattern = "^img[0-9]$";  // no dot: the name without its extension
   EXPECT_TRUE(Same(Run(Make(name)), {{"img1.jpg", 100}, {"img2.jpg", 100}}));
   name.Invert = 1;
   EXPECT_TRUE(Same(Run(Make(name)), {{"IMG-beach.png", 100}, {"img12.jpg", 100}}));
-  name.Invert = 0;
-  name.Pattern = "2\\.jpg$";
-  EXPECT_EQ(HitNames(Run(Make(name))), (Names{"img12.jpg", "img2.jpg"}));
-  name.Mode = 3;
-  name.Pattern = "+img -12 -beach";
-  EXPECT_EQ(HitNames(Run(Make(name))), (Names{"img1.jpg", "img2.jpg"}));
+  name.Invert = 0, name.Pattern = "2\\.jpg$";
+  EXPECT_EQ(Found(Make(name)), (Names{"img12.jpg", "img2.jpg"}));
+  name.Mode = 3, name.Pattern = "+img -12 -beach";
+  EXPECT_EQ(Found(Make(name)), (Names{"img1.jpg", "img2.jpg"}));
   name.Mode = 4;
   EXPECT_TRUE(Run(Make(name)).empty());
 }
@@ -381,8 +358,7 @@ TEST_F(SelBaseTest, ColorAtPlaceScoresMarkedCellsWithinTolerance) {
   for (int i = 0; i < 4; ++i) color.Colors[i] = red;
   EXPECT_TRUE(Same(Run(Make(color)), {{"a", (765 + 765 + 760) / 306000.0 / 0.01 * 100}}));
   // No marked cell: 0 / 0, which no cut-off accepts.
-  color.Reset();
-  color.Active = true;
+  color = Feature<SSelColor>();
   EXPECT_TRUE(Run(Make(color)).empty());
 }
 
@@ -396,9 +372,7 @@ TEST_F(SelBaseTest, ColorAnywhereTakesEachCellOnceAndAtMost20PerColour) {
     Add({.name = "r" + std::to_string(reds), .shape = shape});
   }
   auto color = Feature<SSelColor>();
-  color.Mode = 1;
-  color.Tolerance = 10;
-  color.Colors[0] = red;
+  color.Mode = 1, color.Tolerance = 10, color.Colors[0] = red;
   color.Colors[5] = blue;  // not a palette cell
   EXPECT_TRUE(Same(Run(Make(color)), {{"r10", 50}, {"r30", 100}}));
   color.Colors[20] = red;  // the second red gets what the first left
@@ -412,8 +386,7 @@ TEST_F(SelBaseTest, MatchDispatchesByMethodAndBlendsTheHistogram) {
   auto quick = [&](uint32_t weighting, const SVXWeightMatrix& w) {
     SVXMatchParams p;
     p.SetWeights(30, 25);
-    p.Weighting = weighting;
-    p.Weights = &w;
+    p.Weighting = weighting, p.Weights = &w;
     return MatchCSQuick(o, c, p);
   };
   auto hist = [&](uint32_t weighting) {
@@ -435,25 +408,20 @@ TEST_F(SelBaseTest, MatchDispatchesByMethodAndBlendsTheHistogram) {
   EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], MatchDuplicates(o, c, plain));
   match.Method = 1;
   EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], hist(0));
-  match.Method = 7;
-  match.ColorWeight = 30;
+  match.Method = 7, match.ColorWeight = 30;
   EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], hist(0) * 0.5);
 
   // A mask weighs the worker's comparison only; the histogram keeps the selection's weighting.
-  match.Method = 2;
-  match.Precision = 0;
-  match.ColorWeight = 25;
+  match.Method = 2, match.Precision = 0, match.ColorWeight = 25;
   auto mask = Feature<SSelMask>();
   for (int i = 0; i < 400; ++i) mask.Cells[i] = static_cast<uint8_t>(i % 3);
   SVXWeightMatrix masked;
   masked.SetMask(mask.Cells);
   EXPECT_DOUBLE_EQ(Run(Make(match, mask), {"o"})["c"], quick(3, masked));
-  match.Weighting = 1;
-  match.ColorWeight = 30;
+  match.Weighting = 1, match.ColorWeight = 30;
   SVXMatchParams p = plain;
   p.SetWeights(30, 30);
-  p.Weighting = 3;
-  p.Weights = &masked;
+  p.Weighting = 3, p.Weights = &masked;
   EXPECT_DOUBLE_EQ(Run(Make(match, mask), {"o"})["c"], (hist(1) + MatchCSQuick(o, c, p)) * 0.5);
 }
 
@@ -483,14 +451,6 @@ class SelBasePropsTest : public SelBaseTest {
   void Row(const std::string& name, const std::vector<CVXProperty>& row) {
     ASSERT_EQ(engine_.AddImageProperties(Add({.name = name}), row), VX_OK);
   }
-
-  static SSelProps Prop(const std::string& column, uint32_t type) {
-    auto p = Feature<SSelProps>();
-    p.Table = "Image Properties";
-    p.Column = column;
-    p.DataType = type;
-    return p;
-  }
 };
 
 TEST_F(SelBasePropsTest, StringWordsSubstringsAndEmpty) {
@@ -514,60 +474,55 @@ TEST_F(SelBasePropsTest, StringWordsSubstringsAndEmpty) {
   };
   for (const Case& c : cases) {
     SSelProps p = Prop("Title", vptString);
-    p.Conditions[0].MatchMode = c.mode;
-    p.Conditions[0].Value = CVXProperty(c.value);
+    p.Conditions[0].MatchMode = c.mode, p.Conditions[0].Value = CVXProperty(c.value);
     p.Invert = c.invert;
-    EXPECT_EQ(HitNames(Run(Make(p))), c.hits) << c.mode << " '" << c.value << "' " << c.invert;
+    EXPECT_EQ(Found(Make(p)), c.hits) << c.mode << " '" << c.value << "' " << c.invert;
   }
 }
 
 TEST_F(SelBasePropsTest, NumbersDatesTimesBoolsAndReferences) {
   auto range = [](SSelProps p, int i, CVXProperty low, CVXProperty high, uint32_t op = 0) {
-    p.Conditions[i].Low = low;
-    p.Conditions[i].High = high;
-    p.Conditions[i].Op = op;
+    p.Conditions[i].Low = low, p.Conditions[i].High = high, p.Conditions[i].Op = op;
     return p;
   };
   SSelProps count = range(Prop("Count", vptUInt32), 0, 0u, 10u);
-  EXPECT_EQ(HitNames(Run(Make(count))), (Names{"norow", "red"}));
+  EXPECT_EQ(Found(Make(count)), (Names{"norow", "red"}));
   count.MatchEmpty = true;
-  EXPECT_EQ(HitNames(Run(Make(count))), (Names{"empty", "norow", "red"}));
+  EXPECT_EQ(Found(Make(count)), (Names{"empty", "norow", "red"}));
   count.MatchEmpty = false;
-  EXPECT_EQ(HitNames(Run(Make(range(range(count, 0, 5u, 20u), 1, 10u, 15u, 3)))), (Names{"norow"}));
-  EXPECT_EQ(HitNames(Run(Make(range(range(count, 0, 0u, 1u), 1, 12u, 12u, 1)))), (Names{"blue"}));
-  EXPECT_EQ(HitNames(Run(Make(range(count, 1, 5u, 20u, 2)))), (Names{"norow"}));
+  EXPECT_EQ(Found(Make(range(range(count, 0, 5u, 20u), 1, 10u, 15u, 3))), (Names{"norow"}));
+  EXPECT_EQ(Found(Make(range(range(count, 0, 0u, 1u), 1, 12u, 12u, 1))), (Names{"blue"}));
+  EXPECT_EQ(Found(Make(range(count, 1, 5u, 20u, 2))), (Names{"norow"}));
 
   SSelProps date = Prop("Taken", vptDate);
   date.MatchEmpty = true;  // an empty date fails all the same
   const CVXProperty none;
-  EXPECT_EQ(HitNames(Run(Make(range(date, 0, CVXProperty::MakeDate(45000), none)))),
+  EXPECT_EQ(Found(Make(range(date, 0, CVXProperty::MakeDate(45000), none))),
             (Names{"blue", "red"}));
-  EXPECT_EQ(HitNames(Run(Make(range(date, 0, CVXProperty::MakeDate(45000.9), none)))),
+  EXPECT_EQ(Found(Make(range(date, 0, CVXProperty::MakeDate(45000.9), none))),
             (Names{"blue", "red"}));  // whole days compare
-  EXPECT_EQ(HitNames(Run(Make(range(date, 0, none, CVXProperty::MakeDate(45005))))),
-            (Names{"red"}));
+  EXPECT_EQ(Found(Make(range(date, 0, none, CVXProperty::MakeDate(45005)))), (Names{"red"}));
   SSelProps time = Prop("At", vptTime);
-  EXPECT_EQ(HitNames(Run(Make(range(time, 0, CVXProperty::MakeTime(0.5), none)))), (Names{"blue"}));
+  EXPECT_EQ(Found(Make(range(time, 0, CVXProperty::MakeTime(0.5), none))), (Names{"blue"}));
 
   SSelProps done = Prop("Done", vptBool);
   const std::vector<std::pair<uint32_t, Names>> byFlags = {
       {1, {"red"}}, {2, {"blue"}}, {4, {"empty", "norow"}}, {7, {"blue", "empty", "norow", "red"}}};
   for (const auto& [flags, hits] : byFlags) {
     done.Conditions[0].Flags = flags;
-    EXPECT_EQ(HitNames(Run(Make(done))), hits) << flags;
+    EXPECT_EQ(Found(Make(done)), hits) << flags;
   }
 
   SSelProps ref = Prop("Ref", vptReference);
   ref.Conditions[0].Value = CVXProperty::MakeReference(42);
-  EXPECT_EQ(HitNames(Run(Make(ref))), (Names{"red"}));
+  EXPECT_EQ(Found(Make(ref)), (Names{"red"}));
   ref.Conditions[0].Op = 3;
-  EXPECT_EQ(HitNames(Run(Make(ref))), (Names{"blue"}));
+  EXPECT_EQ(Found(Make(ref)), (Names{"blue"}));
   ref.Conditions[0].MatchMode = 2;
-  EXPECT_EQ(HitNames(Run(Make(ref))), (Names{"blue", "empty", "norow"}));
-  ref.Conditions[0].Op = 0;
-  ref.Conditions[1].Op = 1;
+  EXPECT_EQ(Found(Make(ref)), (Names{"blue", "empty", "norow"}));
+  ref.Conditions[0].Op = 0, ref.Conditions[1].Op = 1;
   ref.Conditions[1].Value = CVXProperty::MakeReference(43);
-  EXPECT_EQ(HitNames(Run(Make(ref))), (Names{"blue", "empty", "norow", "red"}));
+  EXPECT_EQ(Found(Make(ref)), (Names{"blue", "empty", "norow", "red"}));
 }
 
 TEST_F(SelBasePropsTest, AllOrAnyPropertyFeature) {
@@ -583,7 +538,7 @@ TEST_F(SelBasePropsTest, AllOrAnyPropertyFeature) {
   limits.PropsAny = 1;
   EXPECT_TRUE(Same(Run(Make(limits, count, title)), {{"blue", 100}, {"norow", 100}, {"red", 100}}));
   // The first match decides: the unmappable column is never asked for these.
-  EXPECT_EQ(HitNames(Run(Make(limits, count, missing))), (Names{"norow", "red"}));
+  EXPECT_EQ(Found(Make(limits, count, missing)), (Names{"norow", "red"}));
 }
 
 }  // namespace

@@ -1,7 +1,7 @@
 #pragma once
 
-// Shorthands shared by the selection tests: feature records to and from bytes, and the core
-// block that every stored feature starts with.
+// Shorthands shared by the selection tests: feature records and streamed objects to and from
+// bytes, and the core block that every stored feature starts with.
 
 #include <gtest/gtest.h>
 
@@ -22,31 +22,65 @@ inline std::vector<uint8_t> Content(const CVXMemFile& file) {
   return {file.GetBuffer(), file.GetBuffer() + file.GetFileSize()};
 }
 
-// The bytes a record stores; taken by value, since Store may touch the record.
 template <typename T>
-std::vector<uint8_t> Stored(T record, bool withCore = true) {
+T Fresh() {
+  T record;
+  record.Reset();
+  return record;
+}
+
+// The record as a selector holds it (with its core block); taken by value, since Store may
+// touch the record.
+template <typename T>
+CVXMemFile Blob(T record, bool withCore = true) {
   CVXMemFile file;
   record.Store(&file, withCore);
-  return Content(file);
+  return file;
+}
+
+template <typename T>
+std::vector<uint8_t> Stored(const T& record, bool withCore = true) {
+  return Content(Blob(record, withCore));
 }
 
 // A reset record loaded from `bytes`, which it must read to the end.
 template <typename T>
 T Loaded(const std::vector<uint8_t>& bytes, bool withCore = true) {
   CVXMemFile in(bytes.data(), bytes.size());
-  T record;
-  record.Reset();
+  T record = Fresh<T>();
   record.Load(&in, withCore);
   EXPECT_EQ(in.Remaining(), 0u);
   return record;
 }
 
-// The record as a selector holds it: stored with its core block.
+// The bytes of an object written with operator<<.
 template <typename T>
-CVXMemFile Blob(T record) {
+std::vector<uint8_t> Streamed(const T& object) {
   CVXMemFile file;
-  record.Store(&file, true);
-  return file;
+  file << object;
+  return Content(file);
+}
+
+// `target` after reading `bytes` with operator>>, which must read them to the end.
+template <typename T>
+T Read(const std::vector<uint8_t>& bytes, T target) {
+  CVXMemFile in(bytes.data(), bytes.size());
+  in >> target;
+  EXPECT_EQ(in.Remaining(), 0u);
+  return target;
+}
+
+// Every proper prefix of `full` fails to read with VX_NOT_FOUND and leaves a copy of `keep`
+// streaming as it did.
+template <typename T>
+void ExpectPrefixesFail(const std::vector<uint8_t>& full, const T& keep) {
+  const std::vector<uint8_t> kept = Streamed(keep);
+  for (size_t cut = 0; cut < full.size(); ++cut) {
+    T target = keep;
+    CVXMemFile in(full.data(), cut);
+    EXPECT_EQ(ThrownCode([&] { in >> target; }), VX_NOT_FOUND) << cut;
+    ASSERT_EQ(Streamed(target), kept) << cut;
+  }
 }
 
 // Distinct core values: Active, InterActive, Option 7, UserData 0, 1, ..., 127.

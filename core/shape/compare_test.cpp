@@ -46,26 +46,19 @@ CShape WithOriginal(const SVXMatchInfo& info) {
   return shape;
 }
 
-TEST(ShapeCompare, IdenticalRecordsGiveZero) {
+TEST(ShapeCompare, IdenticalRecordsGiveZeroAndMethodsDispatch) {
   std::mt19937 rng(7);
   for (int round = 0; round < 20; ++round) {
-    auto p = Random(rng);
+    auto p = Random(rng), q = Random(rng);
     const CShape shape = WithOriginal(*p);
     for (uint32_t method : {1u, 2u, 3u}) EXPECT_EQ(shape.Compare(*p, Settings(method)), 0);
+    EXPECT_EQ(shape.Compare(*q, Settings(1)), shape.MatchDuplicates(*q, Settings(1)));
+    EXPECT_EQ(shape.Compare(*q, Settings(2)), shape.MatchShapeColorQuick(*q, Settings(2)));
+    EXPECT_EQ(shape.Compare(*q, Settings(3)), shape.MatchShapeColor(*q, Settings(3)));
+    EXPECT_GT(shape.Compare(*q, Settings(2)), 0);
+    for (uint32_t m : {0u, 4u, 6u, 7u}) EXPECT_EQ(shape.Compare(*q, Settings(m)), 0);
+    for (uint32_t m : {1u, 2u, 3u, 8u}) EXPECT_EQ(shape.CompareColor(*q, Settings(m)), 100.0);
   }
-}
-
-TEST(ShapeCompare, DispatchesOnMethod) {
-  std::mt19937 rng(11);
-  auto p = Random(rng), q = Random(rng);
-  const CShape shape = WithOriginal(*p);
-  EXPECT_EQ(shape.Compare(*q, Settings(1)), shape.MatchDuplicates(*q, Settings(1)));
-  EXPECT_EQ(shape.Compare(*q, Settings(2)), shape.MatchShapeColorQuick(*q, Settings(2)));
-  EXPECT_EQ(shape.Compare(*q, Settings(3)), shape.MatchShapeColor(*q, Settings(3)));
-  EXPECT_GT(shape.Compare(*q, Settings(2)), 0);
-  for (uint32_t method : {0u, 4u, 6u, 7u}) EXPECT_EQ(shape.Compare(*q, Settings(method)), 0);
-  for (uint32_t method : {1u, 2u, 3u, 8u})
-    EXPECT_EQ(shape.CompareColor(*q, Settings(method)), 100.0);
 }
 
 TEST(ShapeCompare, DuplicatesSampleEveryFourthCellUnderTheMask) {
@@ -96,8 +89,7 @@ TEST(ShapeCompare, QuickWeighsColourAndShape) {
 
   // The mask scales the query's shape rather than the difference: 57 * 0.5 * 0.9 + |50 - 20|.
   CVexoraSettings masked = Settings(2);
-  masked.Data().UseMask = 1;
-  masked.Data().Mask[Cell(3, 17)] = 50;
+  masked.Data().UseMask = 1, masked.Data().Mask[Cell(3, 17)] = 50;
   EXPECT_NEAR(shape.MatchShapeColorQuick(*q, masked), 55.65 / kQuickNorm, 1e-12);
   // ... and the shape term is truncated toward zero: |trunc(10 - 12.5)| = 2.
   q->Cells[Cell(3, 17)] = {110, 120, 130, 25};
@@ -121,15 +113,13 @@ class ShapeColorTest : public ::testing::Test {
   std::unique_ptr<SVXMatchInfo> q = Filled({100, 100, 100, 0});
 };
 
-TEST_F(ShapeColorTest, NoFittingNeighbourCostsTheLargestDifference) {
+TEST_F(ShapeColorTest, NoFittingNeighbourCostsTheMostAndTheFirstFittingOneWins) {
   p->Cells[Cell(5, 5)].C1 = 200;
   EXPECT_NEAR(Run(), kDMax, 1e-9);
   EXPECT_EQ(WithOriginal(*p).MatchShapeColor(*q, Settings(3, 0.031)), 10000.0);
   EXPECT_NEAR(WithOriginal(*p).MatchShapeColor(*q, Settings(3, 0.032)), 1.0 / 32, 1e-12);
-}
 
-TEST_F(ShapeColorTest, FirstFittingNeighbourWithXOuterWins) {
-  p->Cells[Cell(5, 5)].C1 = 200;
+  // The first fitting neighbour wins, x in the outer loop.
   q->Cells[Cell(4, 7)] = {190, 100, 100, 5};  // reached first: x = 4 before x = 6
   q->Cells[Cell(6, 3)] = {200, 100, 100, 0};  // would cost nothing
   // The cells of p at (4, 7) and (6, 3) no longer fit their own and find a 100 nearby at no cost.
@@ -141,21 +131,18 @@ TEST_F(ShapeColorTest, MaskScalesTheFitAndThePrice) {
   q->Cells[0].C2 = 180;  // 80 off: p's cell 0 fits q's cell 1 instead, at no cost
   EXPECT_NEAR(Run(), 0, 1e-9);
   CVexoraSettings masked = Settings(3);
-  masked.Data().UseMask = 1;
-  masked.Data().Mask[0] = 50;  // 80 * 0.5 fits in place: 80 * 0.9 * 0.5
+  masked.Data().UseMask = 1, masked.Data().Mask[0] = 50;  // 80 * 0.5 fits in place: 80 * 0.9 * 0.5
   EXPECT_NEAR(Run(masked), 36, 1e-9);
 }
 
-TEST_F(ShapeColorTest, NeighbourhoodWrapsAtColumnTwentyWithinTheRecord) {
+TEST_F(ShapeColorTest, NeighbourhoodWrapsAtColumnTwentyAndStopsAtTheEndOfTheRecord) {
   // From (19, 5) the search reaches x = 20, y = 3: index 80, the cell (0, 4).
   p->Cells[Cell(19, 5)].C1 = 200;
   q->Cells[Cell(0, 4)].C1 = 190;
   EXPECT_NEAR(Run(), 7 * 0.9 * 4, 1e-9);
-}
-
-TEST_F(ShapeColorTest, NeighbourhoodStopsAtTheEndOfTheRecord) {
   // From (19, 19) x = 20 reaches (0, 18) and (0, 19); y = 20 and x = 20, y = 19 lie behind the
   // record and are not read (q is a heap block of its own, so a sanitizer would notice).
+  p->Cells[Cell(19, 5)].C1 = q->Cells[Cell(0, 4)].C1 = 100;
   p->Cells[Cell(19, 19)].C1 = 200;
   EXPECT_NEAR(Run(), kDMax, 1e-9);
   q->Cells[Cell(0, 19)].C1 = 190;  // x = 20, y = 18, distance 3
@@ -222,7 +209,7 @@ TEST_F(CompareColorTest, ToleranceEdges) {
   EXPECT_EQ(Run(6, 0), 99.75);
 }
 
-TEST_F(CompareColorTest, PaletteIsTheFirstRow) {
+TEST_F(CompareColorTest, PaletteIsTheFirstRowAndEachColourClaimsTwentyOneCells) {
   SetColor(1, 255, 0, 0);  // not in the palette
   for (SCell& c : q->Cells) c = red;
   EXPECT_EQ(Run(7), 100.0);
@@ -234,10 +221,7 @@ TEST_F(CompareColorTest, PaletteIsTheFirstRow) {
   EXPECT_DOUBLE_EQ(Run(7), 70.0);
   for (int n = 0; n < 20; ++n) q->Cells[n] = red;
   EXPECT_EQ(Run(7), 100.0);  // fully claimed: the sum is 0
-}
 
-TEST_F(CompareColorTest, PaletteColoursClaimTwentyOneCellsEach) {
-  SetColor(0, 255, 0, 0);
   SetColor(20, 255, 0, 0);
   SetColor(40, 255, 0, 0, 0);  // no share: not a colour of the palette
   for (int n = 0; n < 400; ++n) q->Cells[n] = n < 25 ? red : white;

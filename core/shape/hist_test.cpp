@@ -64,7 +64,6 @@ TEST(WeightMatrixTest, KindsAndMask) {
   EXPECT_DOUBLE_EQ(m.W[16 * 20 + 12], 1.1 * 1.5);
   EXPECT_EQ(m.W[17 * 20 + 19], 1.0);
   m.Reset(7);
-  EXPECT_EQ(m.Kind, 7u);
   for (double w : m.W) EXPECT_EQ(w, 1.0);
   uint8_t mask[400];
   for (int i = 0; i < 400; ++i) mask[i] = uint8_t(i % 201);

@@ -91,7 +91,8 @@ TEST(ShapeTest, MatchesReferenceOnManySizes) {
   }
 }
 
-TEST(ShapeTest, EmptyBitmapGivesFalseAndClearedInfo) {
+TEST(ShapeTest, EmptyAndUniformImagesAndCellsAtTheEdge) {
+  using C = std::array<int, 4>;
   CShape shape;
   SVXMatchInfo info;
   std::memset(&info, 0xAB, sizeof info);
@@ -99,12 +100,6 @@ TEST(ShapeTest, EmptyBitmapGivesFalseAndClearedInfo) {
   const SVXMatchInfo zero{};
   EXPECT_EQ(std::memcmp(&info, &zero, sizeof info), 0);
   EXPECT_FALSE(shape.CalcShapeInfo(CVXBitmap(0, 500), info, 127));
-}
-
-TEST(ShapeTest, UniformImagesAndCellsAtTheEdge) {
-  using C = std::array<int, 4>;
-  CShape shape;
-  SVXMatchInfo info;
   // Every full cell is wholly bright. Shape is bright / (area * 0.01) in double, truncated: for
   // cells of 1 x 7 (20 x 140) that is 7 / 0.07, just below 100, so 99.
   const std::tuple<uint32_t, uint32_t, int> uniform[] = {
