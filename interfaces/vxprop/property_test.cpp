@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <tuple>
 #include <vector>
 
 #include "VXException.h"
@@ -55,7 +56,6 @@ std::vector<CVXProperty> OneOfEachType() {
 
 TEST(PropertyTest, EveryTypeRoundTripsThroughAStream) {
   std::vector<CVXProperty> all = OneOfEachType();
-  ASSERT_EQ(all.size(), 13u);
   for (unsigned type = 0; type < all.size(); ++type) {
     const CVXProperty& p = all[type];
     EXPECT_EQ(p.Type(), type);
@@ -117,102 +117,92 @@ TEST(PropertyTest, CorruptStreamsThrowAndLeaveTheTargetAlone) {
   EXPECT_EQ(Read({11, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0xFF, 'a'}, p), VX_NOT_FOUND);
 }
 
+// Dates count days from 1899-12-30, the time of day being the fraction.
 TEST(PropertyTest, SetStringParsesEachTypeAndRejectsWhatDoesNotFit) {
-  EXPECT_EQ(Parsed(" -2147483648 ", vptInt32).Int64(), INT32_MIN);
-  EXPECT_EQ(Parsed("+4294967295", vptUInt32).UInt64(), UINT32_MAX);
-  EXPECT_EQ(Parsed("-9223372036854775808", vptInt64).Int64(), INT64_MIN);
-  EXPECT_EQ(Parsed("18446744073709551615", vptUInt64).UInt64(), UINT64_MAX);
-  EXPECT_EQ(Parsed("1e3", vptDouble).Double(), 1000.0);
-  EXPECT_EQ(Parsed("0.1", vptFloat).Double(), static_cast<double>(0.1f));
-  EXPECT_EQ(Parsed("YES", vptBool).Int64(), 1);
-  EXPECT_EQ(Parsed("false", vptBool).Int64(), 0);
-  EXPECT_EQ(Parsed("42", vptReference).Type(), vptReference);
-  EXPECT_EQ(Parsed("  spaced  ", vptString).Text(), "  spaced  ");
-  EXPECT_EQ(Parsed("", vptLongText).Type(), vptLongText);
-
-  const std::vector<std::pair<std::string, unsigned>> bad = {
-      {"2147483648", vptInt32},
-      {"-1", vptUInt32},
-      {"12abc", vptInt64},
-      {"1.5", vptInt32},
-      {"", vptInt32},
-      {"+-1", vptInt64},
-      {"1e39", vptFloat},
-      {"inf", vptDouble},
-      {"nan", vptDouble},
-      {"0x10", vptDouble},
-      {"maybe", vptBool},
-      {"4294967296", vptReference},
-      {"-0", vptUInt64},
-      {"1", vptEmpty},
-      {"1", 13},
-      {"1900-02-29", vptDate},
-      {"2024-13-01", vptDate},
-      {"2024-04-31", vptDate},
-      {"0000:00:00 00:00:00", vptDate},
-      {"2024:05:01", vptDate},
-      {"2024-05-01 24:00", vptDate},
-      {"2024-05-01 12:60", vptDate},
-      {"2024-05-01T12:00:00Z", vptDate},
-      {"2024-5-1", vptDate},
-      {"12", vptTime},
-      {"12:5", vptTime},
-      {"25:00", vptTime},
+  const std::vector<std::tuple<std::string, unsigned, CVXProperty>> good = {
+      {" -2147483648 ", vptInt32, CVXProperty(int32_t{INT32_MIN})},
+      {"+4294967295", vptUInt32, CVXProperty(uint32_t{UINT32_MAX})},
+      {"-9223372036854775808", vptInt64, CVXProperty(int64_t{INT64_MIN})},
+      {"18446744073709551615", vptUInt64, CVXProperty(uint64_t{UINT64_MAX})},
+      {"1e3", vptDouble, CVXProperty(1000.0)},
+      {"0.1", vptFloat, CVXProperty(0.1f)},
+      {"YES", vptBool, CVXProperty(true)},
+      {"false", vptBool, CVXProperty(false)},
+      {"42", vptReference, CVXProperty::MakeReference(42)},
+      {"  spaced  ", vptString, CVXProperty("  spaced  ")},
+      {"", vptLongText, CVXProperty::MakeLongText("")},
+      {"1899-12-30", vptDate, CVXProperty::MakeDate(0)},
+      {"1899-12-29", vptDate, CVXProperty::MakeDate(-1)},
+      {"1900-03-01", vptDate, CVXProperty::MakeDate(61)},
+      {"2000-02-29", vptDate, CVXProperty::MakeDate(36585)},
+      {"0001-01-01", vptDate, CVXProperty::MakeDate(-693593)},
+      {"2024-05-01 18:00", vptDate, CVXProperty::MakeDate(45413.75)},
+      {"2024-05-01T18:00:00", vptDate, CVXProperty::MakeDate(45413.75)},
+      {"6:00", vptTime, CVXProperty::MakeTime(0.25)},
   };
-  for (const auto& [text, type] : bad) {
-    CVXProperty p("old");
-    EXPECT_FALSE(p.SetString(text, type)) << text << " as " << type;
-    EXPECT_TRUE(p.IsEmpty()) << text;
+  for (const auto& [text, type, want] : good) EXPECT_EQ(Bytes(Parsed(text, type)), Bytes(want));
+
+  const std::vector<std::pair<unsigned, std::vector<std::string>>> bad = {
+      {vptInt32, {"2147483648", "1.5", ""}},
+      {vptUInt32, {"-1"}},
+      {vptInt64, {"12abc", "+-1"}},
+      {vptUInt64, {"-0"}},
+      {vptFloat, {"1e39"}},
+      {vptDouble, {"inf", "nan", "0x10"}},
+      {vptBool, {"maybe"}},
+      {vptReference, {"4294967296"}},
+      {vptEmpty, {"1"}},
+      {13, {"1"}},
+      {vptDate,
+       {"1900-02-29", "2024-13-01", "2024-04-31", "0000:00:00 00:00:00", "2024:05:01",
+        "2024-05-01 24:00", "2024-05-01 12:60", "2024-05-01T12:00:00Z", "2024-5-1"}},
+      {vptTime, {"12", "12:5", "25:00"}},
+  };
+  for (const auto& [type, texts] : bad) {
+    for (const std::string& text : texts) {
+      CVXProperty p("old");
+      EXPECT_FALSE(p.SetString(text, type)) << text << " as " << type;
+      EXPECT_TRUE(p.IsEmpty()) << text;
+    }
   }
 }
 
-TEST(PropertyTest, DatesCountDaysFrom1899December30) {
-  EXPECT_EQ(Parsed("1899-12-30", vptDate).Double(), 0.0);
-  EXPECT_EQ(Parsed("1899-12-29", vptDate).Double(), -1.0);
-  EXPECT_EQ(Parsed("1900-03-01", vptDate).Double(), 61.0);
-  EXPECT_EQ(Parsed("2000-02-29", vptDate).Double(), 36585.0);
-  EXPECT_EQ(Parsed("0001-01-01", vptDate).Double(), -693593.0);
-  EXPECT_EQ(Parsed("2024-05-01 18:00", vptDate).Double(), 45413.75);
-  EXPECT_EQ(Parsed("2024-05-01T18:00:00", vptDate).Double(), 45413.75);
-  EXPECT_EQ(Parsed("6:00", vptTime).Double(), 0.25);
-
-  // EXIF text, and the text of a date read back as the same date.
+TEST(PropertyTest, StringShowsValuesAndAppliesOnlySafeFormats) {
+  CVXProperty date = Parsed("2024-05-01 07:05:09", vptDate), number(int32_t{42});
   CVXProperty exif = Parsed("2024:05:01 13:45:30", vptDate);
-  EXPECT_EQ(exif.String(), "2024-05-01 13:45:30");
-  EXPECT_EQ(Parsed(exif.String(), vptDate), exif);
-  EXPECT_EQ(Parsed("9999-12-31", vptDate).String(), "9999-12-31");
-  EXPECT_EQ(Parsed("1600-02-29", vptDate).String(), "1600-02-29");
-  EXPECT_EQ(CVXProperty::MakeDate(-0.25).String(), "1899-12-29 18:00:00");
-  EXPECT_EQ(CVXProperty::MakeTime(0.5).String(), "12:00:00");
-  // Whole seconds: 23:59:59.7 is the next midnight.
-  EXPECT_EQ(CVXProperty::MakeDate(1 - 0.3 / 86400).String(), "1899-12-31");
-  // Outside the calendar the number is shown.
-  EXPECT_EQ(CVXProperty::MakeDate(1e9).String(), "1e+09");
-}
-
-TEST(PropertyTest, StringAppliesFormatsAndIgnoresUnsafeOnes) {
-  CVXProperty date = Parsed("2024-05-01 07:05:09", vptDate);
-  EXPECT_EQ(date.String("%d.%m.%Y %H:%M"), "01.05.2024 07:05");
-  EXPECT_EQ(date.String("%a %A %b %B %j %y %e %I%p"), "Wed Wednesday May May 122 24  1 07AM");
-  EXPECT_EQ(date.String("%F|%T|%Q|%%|%"), "2024-05-01|07:05:09|%Q|%|%");
-
-  CVXProperty number(int32_t{42});
-  EXPECT_EQ(number.String("%05d"), "00042");
-  EXPECT_EQ(number.String("%lx items"), "2a items");
-  EXPECT_EQ(number.String("%.2f"), "42.00");
-  EXPECT_EQ(number.String("n=%s"), "n=42");
-  EXPECT_EQ(number.String("100%%"), "100%");
-  EXPECT_EQ(CVXProperty(2.5).String("%d"), "2");
-  EXPECT_EQ(CVXProperty("x").String("[%-3s]"), "[x  ]");
-  EXPECT_EQ(CVXProperty(0.1).String(), "0.1");
-  EXPECT_EQ(CVXProperty(0.1f).String(), "0.1");
-  EXPECT_EQ(CVXProperty(uint64_t{UINT64_MAX}).String(), "18446744073709551615");
-  EXPECT_EQ(CVXProperty().String("%d"), "");
+  EXPECT_EQ(Parsed(exif.String(), vptDate), exif);  // the text of a date reads back as it
+  const std::vector<std::tuple<CVXProperty, const char*, std::string>> cases = {
+      {exif, nullptr, "2024-05-01 13:45:30"},
+      {Parsed("9999-12-31", vptDate), nullptr, "9999-12-31"},
+      {Parsed("1600-02-29", vptDate), nullptr, "1600-02-29"},
+      {CVXProperty::MakeDate(-0.25), nullptr, "1899-12-29 18:00:00"},
+      {CVXProperty::MakeTime(0.5), nullptr, "12:00:00"},
+      {CVXProperty::MakeDate(1 - 0.3 / 86400), nullptr, "1899-12-31"},  // whole seconds
+      {CVXProperty::MakeDate(1e9), nullptr, "1e+09"},  // outside the calendar: the number
+      {date, "%d.%m.%Y %H:%M", "01.05.2024 07:05"},
+      {date, "%a %A %b %B %j %y %e %I%p", "Wed Wednesday May May 122 24  1 07AM"},
+      {date, "%F|%T|%Q|%%|%", "2024-05-01|07:05:09|%Q|%|%"},
+      {number, "%05d", "00042"},
+      {number, "%lx items", "2a items"},
+      {number, "%.2f", "42.00"},
+      {number, "n=%s", "n=42"},
+      {number, "100%%", "100%"},
+      {CVXProperty(2.5), "%d", "2"},
+      {CVXProperty("x"), "[%-3s]", "[x  ]"},
+      {CVXProperty(0.1), nullptr, "0.1"},
+      {CVXProperty(0.1f), nullptr, "0.1"},
+      {CVXProperty(uint64_t{UINT64_MAX}), nullptr, "18446744073709551615"},
+      {CVXProperty(), "%d", ""},
+  };
+  for (const auto& [value, format, want] : cases) {
+    EXPECT_EQ(value.String(format), want) << (format ? format : "no format");
+  }
   // Formats that could read a missing argument, or produce unbounded output, are ignored.
-  for (const char* unsafe : {"%d %d", "%n", "%*d", "%c", "%p", "%1000d", "%.1000f", "%"}) {
+  std::string longFormat(300, 'a');
+  for (const char* unsafe :
+       {"%d %d", "%n", "%*d", "%c", "%p", "%1000d", "%.1000f", "%", longFormat.c_str()}) {
     EXPECT_EQ(number.String(unsafe), "42") << unsafe;
   }
-  EXPECT_EQ(number.String(std::string(300, 'a').c_str()), "42");
 }
 
 TEST(PropertyTest, NumericViews) {
@@ -241,10 +231,8 @@ TEST(PropertyTest, OrderIsAStrictWeakOrderOverAllValues) {
 
   for (const auto& a : values) {
     EXPECT_FALSE(a < a);
-    EXPECT_TRUE(a == a);
     for (const auto& b : values) {
       EXPECT_EQ(a == b, !(a < b) && !(b < a));
-      EXPECT_FALSE(a < b && b < a);
       for (const auto& c : values) {
         EXPECT_TRUE(!(a < b && b < c) || a < c);
         EXPECT_TRUE(!(a == b && b == c) || a == c);

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <tuple>
+
 #include "VXException.h"
 #include "VXMemFile.h"
 #include "VXResult.h"
@@ -9,7 +11,6 @@ namespace {
 
 TEST(TableTest, ColumnLookupFollowsIdsNotPositions) {
   CVXTable table(1000);
-  EXPECT_EQ(table.Properties().Table, 1000u);
   EXPECT_EQ(table.AddColumn("Title", vptString), 1u);
   EXPECT_EQ(table.AddColumn("Rating", vptInt32, CVXProperty(int32_t{3})), 2u);
   EXPECT_EQ(table.AddColumn("Bad", 13), 0u);
@@ -41,39 +42,23 @@ TEST(TableTest, ColumnLookupFollowsIdsNotPositions) {
 }
 
 TEST(TableTest, ColumnStreamRoundTripsAndRejectsBadTypes) {
-  SVXColumn in;
-  in.Id = 4;
-  in.Name = "Album";
-  in.Type = vptReference;
-  in.Default = CVXProperty::MakeReference(0);
-  in.LinkTable = 1001;
-  in.LinkColumn = 2;
-  CVXMemFile mem;
-  mem << in;
-  mem.Rewind();
-  SVXColumn out;
-  mem >> out;
-  EXPECT_EQ(out.Id, 4u);
-  EXPECT_EQ(out.Name, "Album");
-  EXPECT_EQ(out.Type, unsigned{vptReference});
-  EXPECT_EQ(out.Default.Type(), unsigned{vptReference});
-  EXPECT_TRUE(out.IsLinked());
-  EXPECT_EQ(out.LinkTable, 1001u);
-  EXPECT_EQ(out.LinkColumn, 2u);
-
-  for (uint32_t type : {0u, 13u}) {
+  SVXColumn in{4, "Album", vptReference, CVXProperty::MakeReference(0), 1001, 2}, out;
+  for (uint32_t type : {uint32_t{vptReference}, 0u, 13u}) {
     in.Type = type;
-    CVXMemFile bad;
-    bad << in;
-    bad.Rewind();
+    CVXMemFile mem;
+    mem << in;
+    mem.Rewind();
     try {
-      bad >> out;
-      ADD_FAILURE() << "type " << type << " accepted";
+      mem >> out;
+      EXPECT_EQ(type, unsigned{vptReference}) << "type " << type << " accepted";
     } catch (CVXException* e) {
       EXPECT_EQ(e->GetCode(), VX_NOT_FOUND);
       delete e;
     }
-    EXPECT_EQ(out.Name, "Album");
+    // A refused column leaves the last good one as it was.
+    EXPECT_EQ(std::tie(out.Id, out.Name, out.Type, out.Default, out.LinkTable, out.LinkColumn),
+              std::tuple(in.Id, in.Name, uint32_t{vptReference}, in.Default, in.LinkTable,
+                         in.LinkColumn));
   }
 }
 

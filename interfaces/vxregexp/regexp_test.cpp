@@ -16,32 +16,20 @@ CVXRegExp Compiled(const std::string& pattern, bool caseless = false) {
   return re;
 }
 
+// The wrapper's own choices: search anywhere, UTF-8 text, case counts unless asked not to.
 TEST(RegExp, SearchesUtf8TextAnywhereUnlessAnchored) {
   EXPECT_EQ(Compiled("mg_[0-9]+").Match("img_0042.jpg"), kMatch);
-  EXPECT_EQ(Compiled("mg_[0-9]+").Match("IMG_0042"), kNoMatch);  // case counts by default
-  EXPECT_EQ(Compiled("^img\\d+$").Match("my img12"), kNoMatch);
   EXPECT_EQ(Compiled("^img\\d+$").Match("img12.jpg"), kNoMatch);
-  // One "." is one character, whatever its byte count; stray bytes hide nothing.
-  EXPECT_EQ(Compiled("^M.ller$").Match("Müller"), kMatch);
-  EXPECT_EQ(Compiled("abc").Match("\xff\xfe"
-                                  "abc\xc3"),
-            kMatch);
-  EXPECT_EQ(Compiled("").Match(""), kMatch);
-}
-
-TEST(RegExp, CaselessFoldsUnicode) {
-  CVXRegExp re = Compiled("müller\\.jpg", true);
-  EXPECT_TRUE(re.IsCaseless());
-  EXPECT_EQ(re.Match("MÜLLER.JPG"), kMatch);
-  EXPECT_EQ(Compiled("É", true).Match("café"), kMatch);
+  EXPECT_EQ(Compiled("^M.ller$").Match("Müller"), kMatch);  // one "." is one character
   EXPECT_EQ(Compiled("müller").Match("MÜLLER"), kNoMatch);
+  EXPECT_EQ(Compiled("müller\\.jpg", true).Match("MÜLLER.JPG"), kMatch);
 }
 
 TEST(RegExp, RefusedPatternGivesErrorAndLeavesNoPattern) {
   CVXRegExp none;
   EXPECT_EQ(none.Match("x"), CVXRegExp::reNoPattern);
-  // The last is refused for its size: its program would be huge.
-  for (std::string bad : {"a(", "[z-a]", "x**", "\xff", "a\\", "((((a{100}){100}){100}){100})"}) {
+  // Bad syntax, bad UTF-8, and a program too large to build.
+  for (std::string bad : {"a(", "\xff", "((((a{100}){100}){100}){100})"}) {
     CVXRegExp re = Compiled("ok");
     std::string error, why;
     EXPECT_EQ(re.SetPattern(bad, &error), CVXRegExp::reError) << bad;

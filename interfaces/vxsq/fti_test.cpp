@@ -26,6 +26,14 @@ class FTITest : public ::testing::Test {
   void Put(uint32_t oid, const std::vector<SFTIRecord>& records) {
     ASSERT_EQ(db.FTISetU(oid, records), 0) << db.GetLastErrorMsg();
   }
+  // The file's records as "tag=value;" in the order they were set.
+  std::string Records(uint32_t oid) {
+    std::vector<SFTIRecord> records{{"stale", "stale"}};
+    EXPECT_EQ(db.FTIGet(oid, records), 0);
+    std::string text;
+    for (const auto& r : records) text += r.Tag + "=" + r.Value + ";";
+    return text;
+  }
   Oids Query(const std::string& tag, const std::string& text, int flag, int32_t a = 0,
              int32_t b = 0) {
     Oids oids{999};
@@ -51,30 +59,23 @@ class FTITest : public ::testing::Test {
 };
 
 TEST_F(FTITest, SetReplacesAllRecordsOfTheFile) {
-  std::vector<SFTIRecord> records;
-  ASSERT_EQ(db.FTIGet(1, records), 0);
-  ASSERT_EQ(records.size(), 4u);
-  EXPECT_EQ(records[1].Tag, "dc:subject");
-  EXPECT_EQ(records[1].Value, "Beach");  // in the order set
-  EXPECT_EQ(records[3].Value, "Müller");
-
+  EXPECT_EQ(
+      Records(1),
+      "dc:subject=Sunset party;dc:subject=Beach;xmp:CreateDate=2021-05-03;dc:creator=Müller;");
   Put(1, {{"dc:subject", "Forest"}});
-  ASSERT_EQ(db.FTIGet(1, records), 0);
-  ASSERT_EQ(records.size(), 1u);
+  EXPECT_EQ(Records(1), "dc:subject=Forest;");
   // The word index follows the records it replaced.
   EXPECT_EQ(Query("dc:subject", "bea", 1), (Oids{2}));
   EXPECT_EQ(Query("dc:subject", "for", 1), (Oids{1}));
 
   Put(1, {});
-  ASSERT_EQ(db.FTIGet(1, records), 0);
-  EXPECT_TRUE(records.empty());
+  EXPECT_EQ(Records(1), "");
   EXPECT_TRUE(Query("", "forest", 2).empty());
   ASSERT_EQ(db.FTIDelete(2), 0);
   EXPECT_EQ(db.FTIDelete(2), 0);
   EXPECT_TRUE(Query("", "beach", 2) == Oids{5});
   EXPECT_EQ(db.FTISetU(0, {{"t", "v"}}), -1);
-  ASSERT_EQ(db.FTIGet(77, records), 0);
-  EXPECT_TRUE(records.empty());
+  EXPECT_EQ(Records(77), "");
 }
 
 TEST_F(FTITest, TagsCountFiles) {
@@ -139,35 +140,29 @@ TEST_F(FTITest, ExactQueryComparesTheCutValue) {
 
 TEST_F(FTITest, WordQueries) {
   EXPECT_EQ(Query("dc:subject", "bea", 1), (Oids{1, 2}));
-  EXPECT_EQ(Query("dc:subject", "BEA", 1), (Oids{1, 2}));
   EXPECT_EQ(Query("dc:subject", "par sun", 1), (Oids{1}));
   EXPECT_TRUE(Query("dc:subject", "sun mount", 1).empty());  // all words in one value
-  EXPECT_TRUE(Query("dc:subject", "unset", 1).empty());      // prefixes of words only
   EXPECT_EQ(Query("", "bea", 1), (Oids{1, 2, 5}));
   EXPECT_EQ(Query("dc:creator", "muller", 1), (Oids{1, 2}));  // case and diacritics
   EXPECT_EQ(Query("dc:subject", " \t", 1), (Oids{1, 2, 3}));  // no words: every file
   EXPECT_EQ(Query("dc:subject", "\"bea", 1), (Oids{1, 2}));   // quotes are text here
   EXPECT_EQ(Query("dc:subject", "AND OR NOT", 1), Oids{});
 
-  EXPECT_EQ(Query("dc:subject", "beach OR mountain", 2), (Oids{1, 2, 3}));
+  // Full-text query syntax goes to the index as it is.
   EXPECT_EQ(Query("dc:subject", "beach OR sunset", 2), (Oids{1, 2}));  // each file once
-  EXPECT_EQ(Query("dc:subject", "sun* NOT party", 2), Oids{});
-  EXPECT_EQ(Query("dc:subject", "\"sunset party\"", 2), (Oids{1}));
-  EXPECT_EQ(Query("", "beach", 2), (Oids{1, 2, 5}));
+  EXPECT_EQ(Query("", "beach OR mountain", 2), (Oids{1, 2, 3, 5}));
 }
 
 TEST_F(FTITest, MalformedQueriesFailWithoutHarm) {
-  for (const char* bad : {"AND (", "\"unclosed", "beach OR", "(((", "nosuchcolumn: x", "*"}) {
+  // Bad syntax, a column filter, and unknown flags.
+  for (auto [bad, flag, rc] : std::vector<std::tuple<const char*, int, int>>{
+           {"nosuchcolumn: x", 2, 1}, {"x", 3, -1}, {"x", 32, -1}, {"AND (", 2, 1}}) {
     Oids oids{42};
-    EXPECT_NE(db.FTIQuery("dc:subject", bad, 2, oids, 0, 0), 0) << bad;
+    EXPECT_EQ(db.FTIQuery("dc:subject", bad, flag, oids, 0, 0), rc) << bad;
     EXPECT_EQ(oids, Oids{42}) << bad;
     EXPECT_FALSE(db.GetLastErrorMsg().empty());
   }
-  Oids oids;
-  EXPECT_EQ(db.FTIQuery("dc:subject", "AND (", 2, oids, 0, 0), 1);
   EXPECT_NE(db.GetLastErrorMsg().find("syntax error"), std::string::npos);
-  EXPECT_EQ(db.FTIQuery("dc:subject", "x", 3, oids, 0, 0), -1);
-  EXPECT_EQ(db.FTIQuery("dc:subject", "x", 32, oids, 0, 0), -1);
   EXPECT_EQ(Query("dc:subject", "bea", 1), (Oids{1, 2}));  // still usable
 }
 

@@ -25,11 +25,13 @@ class XMPDBTest : public ::testing::Test {
   void SetUp() override { ASSERT_EQ(db.Create(path), 0) << db.GetLastErrorMsg(); }
 
   void Put(SXMPRecord r, bool pending = false) { ASSERT_EQ(db.Set(r, pending), 0); }
-  // The packet of oid, or "-" when it has no record.
-  std::string Packet(uint32_t oid) {
+  // The record of oid as "packet|rating|label[|pending]", or "-" when it has none.
+  std::string Stored(uint32_t oid, bool clearPending = false) {
     SXMPRecord r;
     r.Oid = oid;
-    return db.Get(r, false) == 0 ? r.Packet : "-";
+    if (db.Get(r, clearPending) != 0) return "-";
+    return r.Packet + "|" + std::to_string(r.Rating) + "|" + r.Label +
+           (r.PendingWriteBack ? "|pending" : "");
   }
   Oids Query(const std::string& tag, const std::string& text, int flag) {
     Oids oids;
@@ -57,15 +59,8 @@ TEST_F(XMPDBTest, SetGetDeleteAndThePendingFlag) {
   ASSERT_EQ(db.GetPendingUpdates(pending), 0);
   EXPECT_EQ(pending, (Oids{3, 5}));
 
-  SXMPRecord out;
-  out.Oid = 5;
-  ASSERT_EQ(db.Get(out, true), 0);
-  EXPECT_EQ(out.Packet, in.Packet);
-  EXPECT_EQ(out.Rating, -1);
-  EXPECT_EQ(out.Label, "Rot");
-  EXPECT_TRUE(out.PendingWriteBack);  // as it was stored; cleared now
-  ASSERT_EQ(db.Get(out, true), 0);
-  EXPECT_FALSE(out.PendingWriteBack);
+  EXPECT_EQ(Stored(5, true), in.Packet + "|-1|Rot|pending");  // as it was stored; cleared now
+  EXPECT_EQ(Stored(5, true), in.Packet + "|-1|Rot");
   ASSERT_EQ(db.GetPendingUpdates(pending), 0);
   EXPECT_EQ(pending, (Oids{3}));
 
@@ -78,7 +73,7 @@ TEST_F(XMPDBTest, SetGetDeleteAndThePendingFlag) {
 
   ASSERT_EQ(db.FTISetU(5, {{"dc:title", "t"}}), 0);
   EXPECT_EQ(db.Delete(5), 0);
-  EXPECT_EQ(Packet(5), "-");
+  EXPECT_EQ(Stored(5), "-");
   EXPECT_EQ(FTICount(5), 1u);  // Delete leaves the full-text records
   EXPECT_EQ(db.Delete(5), 0);
 }
@@ -102,7 +97,7 @@ TEST_F(XMPDBTest, RankAndLabelLists) {
   EXPECT_EQ(oids, (Oids{1, 2, 3, 5}));
 }
 
-TEST_F(XMPDBTest, MoveReKeysBothKindsOfData) {
+TEST_F(XMPDBTest, MoveAndCopyReKeyBothKindsOfData) {
   Put(Rec(1, "one", 3, "Blue"), true);
   ASSERT_EQ(db.FTISetU(1, {{"dc:subject", "beach"}, {"dc:subject", "sun"}}), 0);
   ASSERT_EQ(db.FTISetU(2, {{"dc:subject", "rain"}}), 0);
@@ -113,38 +108,28 @@ TEST_F(XMPDBTest, MoveReKeysBothKindsOfData) {
     EXPECT_EQ(db.Move(from, to), -1) << from << " " << to;
   }
   ASSERT_EQ(db.Move(1, 9), 0) << db.GetLastErrorMsg();
-  EXPECT_EQ(Packet(1), "-");
+  EXPECT_EQ(Stored(1), "-");
   EXPECT_EQ(FTICount(1), 0u);
-  SXMPRecord moved = Rec(9, "");
-  ASSERT_EQ(db.Get(moved, false), 0);
-  EXPECT_EQ(moved.Packet, "one");
-  EXPECT_EQ(moved.Label, "Blue");
-  EXPECT_TRUE(moved.PendingWriteBack);
+  EXPECT_EQ(Stored(9), "one|3|Blue|pending");
   EXPECT_EQ(Query("dc:subject", "bea", 1), (Oids{9}));
   ASSERT_EQ(db.Move(2, 4), 0);  // full-text data alone is enough
   EXPECT_EQ(Query("", "rain", 2), (Oids{4}));
-}
 
-TEST_F(XMPDBTest, CopyReplacesTheTarget) {
-  Put(Rec(1, "one", 2, "Blue"));
-  ASSERT_EQ(db.FTISetU(1, {{"dc:subject", "beach"}}), 0);
-  Put(Rec(2, "old"));
-  ASSERT_EQ(db.FTISetU(2, {{"dc:subject", "old"}, {"dc:title", "old"}}), 0);
-  ASSERT_EQ(db.Copy(1, 2), 0) << db.GetLastErrorMsg();
-  EXPECT_EQ(Packet(1), "one");
-  EXPECT_EQ(Packet(2), "one");
-  EXPECT_EQ(FTICount(2), 1u);
-  EXPECT_EQ(Query("dc:subject", "beach", 2), (Oids{1, 2}));
+  // Copy replaces whatever the target had.
+  ASSERT_EQ(db.FTISetU(3, {{"dc:title", "old"}}), 0);
+  ASSERT_EQ(db.Copy(9, 3), 0) << db.GetLastErrorMsg();
+  EXPECT_EQ(Stored(9), "one|3|Blue|pending");
+  EXPECT_EQ(Stored(3), "one|3|Blue|pending");
+  EXPECT_EQ(FTICount(3), 2u);
+  EXPECT_EQ(Query("dc:subject", "beach", 2), (Oids{3, 9}));
   EXPECT_TRUE(Query("", "old", 2).empty());
-
-  ASSERT_EQ(db.Copy(1, 1), 0);
-  EXPECT_EQ(FTICount(1), 1u);
+  ASSERT_EQ(db.Copy(9, 9), 0);
+  EXPECT_EQ(FTICount(9), 2u);
   EXPECT_EQ(db.Copy(5, 6), -1);
-  EXPECT_EQ(db.Copy(1, 0), -1);
-  ASSERT_EQ(db.FTISetU(7, {{"t", "v"}}), 0);
-  ASSERT_EQ(db.Copy(7, 2), 0);  // the target's XMP record goes with the rest
-  EXPECT_EQ(Packet(2), "-");
-  EXPECT_EQ(Query("t", "v", 0), (Oids{2, 7}));
+  EXPECT_EQ(db.Copy(9, 0), -1);
+  ASSERT_EQ(db.Copy(4, 3), 0);  // the target's XMP record goes with the rest
+  EXPECT_EQ(Stored(3), "-");
+  EXPECT_EQ(Query("", "rain", 2), (Oids{3, 4}));
 }
 
 TEST_F(XMPDBTest, ReopenKeepsDataAndRefusesOtherFiles) {
@@ -152,7 +137,7 @@ TEST_F(XMPDBTest, ReopenKeepsDataAndRefusesOtherFiles) {
   ASSERT_EQ(db.FTISetU(1, {{"dc:subject", "Strand"}}), 0);
   ASSERT_EQ(db.Close(), 0);
   ASSERT_EQ(db.Open(path), 0) << db.GetLastErrorMsg();
-  EXPECT_EQ(Packet(1), "one");
+  EXPECT_EQ(Stored(1), "one|1|L|pending");
   EXPECT_EQ(Query("dc:subject", "str", 1), (Oids{1}));
 
   // An SQLite file of another kind is refused and left unlocked.
@@ -200,15 +185,14 @@ TEST_F(XMPDBTest, ConcurrentCallsStayConsistent) {
       uint32_t oid = base + k % 20;
       std::string v = "w" + std::to_string(base) + "-" + std::to_string(k);
       SXMPRecord r = Rec(oid, v);
-      if (db.Set(r, false) != 0 || Packet(oid) != v) ++failures;
+      if (db.Set(r, false) != 0 || Stored(oid) != v + "|0|") ++failures;
       if (db.FTISetU(oid, {{"w", v}}) != 0) ++failures;
       Oids hit;
       if (db.FTIQuery("w", v, 0, hit, 0, 0) != 0 || hit != Oids{oid}) ++failures;
 
       CSQLiteTransaction trans(db);
       if (!trans.BeginTrans()) ++failures;
-      SXMPRecord shared;
-      shared.Oid = kShared;
+      SXMPRecord shared = Rec(kShared, "");
       std::vector<SFTIRecord> fti;
       if (db.Get(shared, false) == 0 && db.FTIGet(kShared, fti) == 0) {
         ++reads;
@@ -226,7 +210,7 @@ TEST_F(XMPDBTest, ConcurrentCallsStayConsistent) {
   EXPECT_EQ(failures, 0);
   EXPECT_EQ(torn, 0);
   EXPECT_GT(reads, 0);
-  EXPECT_EQ(Packet(kShared), "v" + std::to_string(kWrites - 1));
+  EXPECT_EQ(Stored(kShared), "v" + std::to_string(kWrites - 1) + "|0|");
   EXPECT_EQ(Query("w", "", 0).size(), 80u);
 }
 
