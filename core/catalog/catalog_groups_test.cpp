@@ -1,24 +1,13 @@
 #include <gtest/gtest.h>
 
-#include <string>
-#include <vector>
-
-#include "VXEngine.h"
-#include "VXGroup.h"
-#include "VXGroupParser.h"
-#include "VXResult.h"
-#include "vxcatalog.h"
 #include "vxcatalog_fixture.h"
-#include "vxtest.h"
 
 namespace {
 
 using CatalogGroups = vxtest::CatalogFixture;
 
 TEST_F(CatalogGroups, TreeNamesAndParentLinks) {
-  uint32_t a = AddGroup("A");
-  uint32_t b = AddGroup("B", a);
-  uint32_t top = AddGroup("Top", VX_ALL_GROUP_OID);
+  uint32_t a = AddGroup("A"), b = AddGroup("B", a), top = AddGroup("Top", VX_ALL_GROUP_OID);
   EXPECT_EQ(Group(top).Parent(), 0u) << "a parent of @All means no parent";
   EXPECT_EQ(Group(a).Children(), std::vector<uint32_t>{b});
   std::string name;
@@ -45,8 +34,7 @@ TEST_F(CatalogGroups, TreeNamesAndParentLinks) {
 }
 
 TEST_F(CatalogGroups, ChildCyclesEndWithCircular) {
-  uint32_t a = AddGroup("a");
-  uint32_t b = AddGroup("b", a);
+  uint32_t a = AddGroup("a"), b = AddGroup("b", a);
   CVXGroup loop = Group(b);
   loop.Children().push_back(a);  // b -> a -> b
   ASSERT_EQ(Cat().UpdateGroup(loop), VX_OK);
@@ -62,10 +50,7 @@ TEST_F(CatalogGroups, ChildCyclesEndWithCircular) {
 }
 
 TEST_F(CatalogGroups, ReorderSiblings) {
-  uint32_t p = AddGroup("p");
-  uint32_t a = AddGroup("a", p);
-  uint32_t b = AddGroup("b", p);
-  uint32_t c = AddGroup("c", p);
+  uint32_t p = AddGroup("p"), a = AddGroup("a", p), b = AddGroup("b", p), c = AddGroup("c", p);
   uint32_t x = AddGroup("x");
   ASSERT_EQ(Cat().ReorderGroup(c, a, true), VX_OK);
   EXPECT_EQ(Group(p).Children(), (std::vector<uint32_t>{c, a, b}));
@@ -81,37 +66,33 @@ TEST_F(CatalogGroups, ReorderSiblings) {
 }
 
 TEST_F(CatalogGroups, FileAssignment) {
-  uint32_t a = AddGroup("a");
-  uint32_t b = AddGroup("b");
+  uint32_t a = AddGroup("a"), b = AddGroup("b");
+  auto groupsOf = [&](const auto& files) {
+    std::vector<uint32_t> groups;
+    Cat().GetFileGroups(files, groups);
+    return groups;
+  };
   ASSERT_EQ(Cat().SetFileGroups(7, {a, b}, true), VX_OK);
-  std::vector<uint32_t> groups;
-  Cat().GetFileGroups(7, groups);
-  EXPECT_EQ(groups, (std::vector<uint32_t>{a, b}));
-  Cat().GetFileGroups(std::vector<uint32_t>{3, 7}, groups);
-  EXPECT_EQ(groups, (std::vector<uint32_t>{a, b}));
+  EXPECT_EQ(groupsOf(7), (std::vector<uint32_t>{a, b}));
+  EXPECT_EQ(groupsOf(std::vector<uint32_t>{3, 7}), (std::vector<uint32_t>{a, b}));
   ASSERT_EQ(Cat().SetFileGroups(7, {b}, false), VX_OK);
-  Cat().GetFileGroups(7, groups);
-  EXPECT_EQ(groups, std::vector<uint32_t>{b});
+  EXPECT_EQ(groupsOf(7), std::vector<uint32_t>{b});
   ASSERT_EQ(Cat().SetFileGroups(7, {}, false), VX_OK);
-  Cat().GetFileGroups(7, groups);
-  EXPECT_TRUE(groups.empty());
+  EXPECT_TRUE(groupsOf(7).empty());
 }
 
 TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
-  uint32_t root = AddGroup("Models");
-  CVXGroup r = Group(root);
-  r.FTITag() = "EXIF:Model";
-  Store(r);
-  uint32_t child = AddGroup("Canon", root);
-  CVXGroup c = Group(child);
-  c.FTITag() = "EXIF:Model";
-  c.FTIPattern() = "Canon";
-  Store(c);
-  uint32_t byHand = AddGroup("Mine", root);
-  uint32_t other = AddGroup("Keywords");
-  CVXGroup o = Group(other);
-  o.FTITag() = "dc:subject";
-  Store(o);
+  auto dataDriven = [&](const std::string& name, uint32_t parent, const std::string& tag,
+                        const std::string& pattern = "") {
+    CVXGroup g = Group(AddGroup(name, parent));
+    g.FTITag() = tag;
+    g.FTIPattern() = pattern;
+    Store(g);
+    return g.Oid();
+  };
+  uint32_t root = dataDriven("Models", 0, "EXIF:Model");
+  uint32_t child = dataDriven("Canon", root, "EXIF:Model", "Canon");
+  uint32_t byHand = AddGroup("Mine", root), other = dataDriven("Keywords", 0, "dc:subject");
 
   std::vector<uint32_t> roots;
   Cat().GetDynamicGroups(roots);
@@ -137,9 +118,7 @@ TEST_F(CatalogGroups, DataDrivenCategoriesAreMarkedAndCleared) {
 }
 
 TEST_F(CatalogGroups, FolderReferencesMoveToAnotherFolder) {
-  uint32_t from = AddFolder("c:/old/");
-  uint32_t to = AddFolder("c:/new/");
-  uint32_t cat = AddGroup("ByFolder");
+  uint32_t from = AddFolder("c:/old/"), to = AddFolder("c:/new/"), cat = AddGroup("ByFolder");
   CVXGroup g = Group(cat);
   ASSERT_EQ(g.SetExpression(Cat(), "\"Folder@c:/old/<VOL.1234>\"").code, VX_OK);
   Store(g);

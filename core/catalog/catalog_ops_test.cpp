@@ -1,18 +1,7 @@
 #include <gtest/gtest.h>
 
-#include <string>
-#include <vector>
-
-#include "VXCatFile.h"
-#include "VXEngine.h"
-#include "VXException.h"
-#include "VXFolder.h"
 #include "VXMemFile.h"
-#include "VXResult.h"
-#include "VXURI.h"
-#include "vxcatalog.h"
 #include "vxcatalog_fixture.h"
-#include "vxtest.h"
 
 namespace {
 
@@ -28,8 +17,7 @@ class CatalogOps : public vxtest::CatalogFixture {
 };
 
 TEST_F(CatalogOps, TreeLinksWhateverTheOrderAndSurvivesReopen) {
-  uint32_t b = AddFolder("c:\\a\\b");
-  uint32_t c = AddFolder("c:\\a\\b\\c");
+  uint32_t b = AddFolder("c:\\a\\b"), c = AddFolder("c:\\a\\b\\c");
   uint32_t a = AddFolder("c:\\a");  // added after its child: ConnectChildren links it
   uint32_t other = AddFolder("c:\\a\\b", "VOL", "9999");
   EXPECT_EQ(Folder(b).ParentFolder(), a);
@@ -82,10 +70,8 @@ TEST_F(CatalogOps, TreeLinksWhateverTheOrderAndSurvivesReopen) {
 }
 
 TEST_F(CatalogOps, LookupsAndFileSets) {
-  uint32_t d = AddFolder("/pics/");
-  uint32_t e = AddFolder("/other/", "X", "");
-  uint32_t wide = AddFile(d, "IMG1.JPG", 40, 30, 5);
-  uint32_t square = AddFile(d, "sq.png", 20, 20, 5);
+  uint32_t d = AddFolder("/pics/"), e = AddFolder("/other/", "X", "");
+  uint32_t wide = AddFile(d, "IMG1.JPG", 40, 30, 5), square = AddFile(d, "sq.png", 20, 20, 5);
   uint32_t tall = AddFile(e, "tall.jpg", 10, 30, 6);
   EXPECT_EQ(Cat().LookupFile("img1.jpg", d), wide);
   EXPECT_EQ(Cat().LookupFile("img1.jpg", 999), 0u);
@@ -107,11 +93,8 @@ TEST_F(CatalogOps, LookupsAndFileSets) {
 }
 
 TEST_F(CatalogOps, MoveAndCopyReplaceFilesInTheWay) {
-  uint32_t src = AddFolder("/src/");
-  uint32_t dst = AddFolder("/dst/");
-  uint32_t a = AddFile(src, "a.jpg");
-  uint32_t b = AddFile(src, "b.jpg");
-  uint32_t victim = AddFile(dst, "A.JPG");
+  uint32_t src = AddFolder("/src/"), dst = AddFolder("/dst/");
+  uint32_t a = AddFile(src, "a.jpg"), b = AddFile(src, "b.jpg"), victim = AddFile(dst, "A.JPG");
 
   // Within one folder, no new name: the file stays, once, at the end of the list.
   ASSERT_EQ(Cat().MoveFile(a, src, ""), VX_OK);
@@ -147,8 +130,7 @@ TEST_F(CatalogOps, MoveAndCopyReplaceFilesInTheWay) {
 }
 
 TEST_F(CatalogOps, RenameAndUpdateFiles) {
-  uint32_t d = AddFolder("/pics/");
-  uint32_t f = AddFile(d, "old.jpg");
+  uint32_t d = AddFolder("/pics/"), f = AddFile(d, "old.jpg");
   ASSERT_EQ(Cat().RenameFile(f, "new.jpg"), VX_OK);
   EXPECT_EQ(Cat().LookupFile("NEW.JPG", d), f);
   CVXCatFile record;
@@ -166,9 +148,7 @@ TEST_F(CatalogOps, RenameAndUpdateFiles) {
 }
 
 TEST_F(CatalogOps, RemoveFoldersWithAndWithoutChildren) {
-  uint32_t a = AddFolder("/a/");
-  uint32_t b = AddFolder("/a/b/");
-  uint32_t c = AddFolder("/a/b/c/");
+  uint32_t a = AddFolder("/a/"), b = AddFolder("/a/b/"), c = AddFolder("/a/b/c/");
   uint32_t f = AddFile(c, "x.jpg");
   AddFile(a, "y.jpg");
   ASSERT_EQ(Cat().RemoveFolder(b, false), VX_OK);
@@ -198,11 +178,8 @@ TEST_F(CatalogOps, RemoveFoldersWithAndWithoutChildren) {
 }
 
 TEST_F(CatalogOps, RenameFolderMovesTreesAndMerges) {
-  uint32_t a = AddFolder("/a/");
-  uint32_t b = AddFolder("/a/b/");
-  uint32_t c = AddFolder("/a/b/c/");
-  uint32_t f = AddFile(c, "x.jpg");
-  uint32_t z = AddFolder("/z/");
+  uint32_t a = AddFolder("/a/"), b = AddFolder("/a/b/"), c = AddFolder("/a/b/c/");
+  uint32_t f = AddFile(c, "x.jpg"), z = AddFolder("/z/");
 
   // Only the case differs: the new spelling is stored, nothing else moves.
   ASSERT_EQ(Cat().RenameFolder(b, CVXURI("/a/B/", true), "VOL", "1234"), VX_OK);
@@ -232,8 +209,7 @@ TEST_F(CatalogOps, RenameFolderMovesTreesAndMerges) {
 }
 
 TEST_F(CatalogOps, LoadRemapsAFolderWhoseParentDoesNotFitItsPath) {
-  uint32_t ca = AddFolder("c:/a/");
-  uint32_t da = AddFolder("d:/a/");
+  uint32_t ca = AddFolder("c:/a/"), da = AddFolder("d:/a/");
   // A folder stored under a parent on another drive, as a move outside the catalog leaves it.
   uint32_t oid = Cat().GenerateFolderOID();
   CVXFolder stray(CVXURI("c:/a/b/", true), oid, da);

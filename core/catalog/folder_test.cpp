@@ -33,25 +33,15 @@ std::vector<uint8_t> Serialise(const CVXFolder& f) {
 // A folder with a distinct value in every field that the current record holds.
 Folder Sample() {
   Folder f(CVXURI("c:\\pics", true), 0x0A0B0C0D, 3);
-  f.LastUpdate() = 0x12345678;
-  f.MayBeOffline() = true;
-  f.MediaID() = "DISK";
-  f.MediaSerial() = "0xDEADBEEF";
-  f.Comment() = "c";
-  f.IsDBRelative() = true;
-  f.Children() = {7, 8};
-  f.Files() = {9};
-  f.Thumbnail() = 9;
+  f.LastUpdate() = 0x12345678, f.MayBeOffline() = true, f.IsDBRelative() = true;
+  f.MediaID() = "DISK", f.MediaSerial() = "0xDEADBEEF", f.Comment() = "c";
+  f.Children() = {7, 8}, f.Files() = {9}, f.Thumbnail() = 9;
   CVXFolder::SData& d = f.Properties();
-  d.HasCredentials = true;
+  d.HasCredentials = true, d.Proxy = "proxy", d.ProxyPort = 8080;
   std::memset(d.Credential1, 'u', sizeof d.Credential1);
   std::memset(d.Credential2, 'p', sizeof d.Credential2);
-  d.Proxy = "proxy";
-  d.ProxyPort = 8080;
   f.SetFriendlyName("Pics");
-  f.Flags() = 0x40;
-  f.LastActiveOid() = 9;
-  f.ThumbSize() = -1;
+  f.Flags() = 0x40, f.LastActiveOid() = 9, f.ThumbSize() = -1;
   return f;
 }
 
@@ -171,13 +161,15 @@ TEST(Folder, ListsKeepNoDuplicatesAndTouchOnlyOnChange) {
   EXPECT_EQ(f.Children(), (std::vector<uint32_t>{3, 4}));
 }
 
-TEST(Folder, FriendlyNameFallsBackToTheLastName) {
+TEST(Folder, FriendlyNameFallsBackToTheLastNameAndOrderFollowsTheUri) {
   CVXFolder root(CVXURI("c:/", true), 1, 0);
   EXPECT_EQ(root.FriendlyName(), "c:/");
   root.SetFriendlyName("Drive C");
   EXPECT_EQ(root.FriendlyName(), "Drive C");
   root.SetFriendlyName("");
   EXPECT_EQ(root.FriendlyName(), "c:/");
+  CVXFolder x(CVXURI("c:/a", true), 1, 0), y(CVXURI("C:/B", true), 2, 0);
+  EXPECT_TRUE(x < y && !(y < x));
 }
 
 TEST(Folder, MediaSerialWindows) {
@@ -191,12 +183,6 @@ TEST(Folder, MediaSerialWindows) {
     f.MediaSerial() = serial;
     EXPECT_EQ(f.MediaSerialWindows(), shown) << serial;
   }
-}
-
-TEST(Folder, OrderFollowsTheUri) {
-  CVXFolder x(CVXURI("c:/a", true), 1, 0), y(CVXURI("C:/B", true), 2, 0);
-  EXPECT_TRUE(x < y);
-  EXPECT_FALSE(y < x);
 }
 
 }  // namespace

@@ -13,14 +13,7 @@ struct Decomposition {
   bool folder;
   const char* text;
   CVXURI::EType type;
-  const char* windows;
-  const char* uriPath;
-  const char* server;
-  const char* path;
-  const char* fileName;
-  const char* namePart;
-  const char* extPart;
-  const char* lastName;
+  const char *windows, *uriPath, *server, *path, *fileName, *namePart, *extPart, *lastName;
 };
 
 TEST(URI, SetNormalisesAndDecomposes) {
@@ -74,6 +67,10 @@ TEST(URI, SetNormalisesAndDecomposes) {
     EXPECT_EQ(uri.ExtPart(), c.extPart);
     EXPECT_EQ(uri.LastName(), c.lastName);
   }
+  // Short roots keep their separator.
+  EXPECT_EQ(CVXURI::StripTrailer("c:/"), "c:/");
+  EXPECT_EQ(CVXURI::StripTrailer("abc\\"), "abc");
+  EXPECT_EQ(CVXURI::StripProtocol("a://b://c"), "b://c");
 }
 
 TEST(URI, NamesLongerThan255BytesAreCutBeforeTheExtensionIsFound) {
@@ -85,18 +82,11 @@ TEST(URI, NamesLongerThan255BytesAreCutBeforeTheExtensionIsFound) {
   EXPECT_EQ(ext(300).ExtPart(), ".jpg");
 }
 
-TEST(URI, StripTrailerKeepsShortRoots) {
-  EXPECT_EQ(CVXURI::StripTrailer("c:/"), "c:/");
-  EXPECT_EQ(CVXURI::StripTrailer("abc\\"), "abc");
-  EXPECT_EQ(CVXURI::StripProtocol("a://b://c"), "b://c");
-}
-
 struct Ordering {
   const char* a;
   bool aFolder;
   const char* b;
-  bool bFolder;
-  bool equal, aLess, bLess;
+  bool bFolder, equal, aLess, bLess;
 };
 
 TEST(URI, ComparisonIgnoresCaseAndTypeButNotTheFolderFlag) {

@@ -1,22 +1,15 @@
 #include <gtest/gtest.h>
 
-#include <string>
-#include <vector>
-
-#include "VXCatFile.h"
-#include "VXEngine.h"
-#include "VXFolder.h"
-#include "VXGroup.h"
-#include "VXResult.h"
-#include "VXURI.h"
 #include "VXXMPDB.h"
-#include "vxcatalog.h"
 #include "vxcatalog_fixture.h"
-#include "vxtest.h"
 
 namespace {
 
 using Oids = std::vector<uint32_t>;
+
+// The files' OIDs, as a fresh catalog hands them out.
+enum : uint32_t { r1 = 1, r2, s1, s2, o1, o2 };
+const Oids kFiles = {r1, r2, s1, s2, o1, o2};
 
 // On a closed engine whose XMP database is open:
 //   c:/pics (VOL.1234): r1 r2     c:/pics/sub: s1 s2     d:/other (no media): o1 o2
@@ -29,30 +22,16 @@ class Calc : public vxtest::CatalogFixture {
     ASSERT_EQ(engine_.XMPDB().Create(dir_ / "db.v3x"), 0);
     uint32_t root = AddFolder("c:/pics", "VOL"), sub = AddFolder("c:/pics/sub", "VOL");
     uint32_t other = AddFolder("d:/other", "", "");
-    for (uint32_t folder : {root, root, sub, sub, other, other}) {
-      uint32_t oid = Cat().GenerateFileOID();
-      ASSERT_EQ(Cat().AddFile(folder, CVXCatFile(oid, std::to_string(oid), folder)), VX_OK);
-      f_.push_back(oid);
-    }
-    a_ = AddGroup("A", 0, {r1(), s1()});
-    b_ = AddGroup("B", 0, {r2()});
-    b1_ = AddGroup("B1", b_, {s1(), s2()});
-    c_ = AddGroup("C", 0, {});
-    for (uint32_t f : {r1(), o1()}) {
+    const uint32_t folders[] = {root, root, sub, sub, other, other};
+    for (uint32_t f : kFiles) ASSERT_EQ(AddFile(folders[f - r1], std::to_string(f)), f);
+    a_ = AddGroup("A", 0, {r1, s1}), b_ = AddGroup("B", 0, {r2});
+    b1_ = AddGroup("B1", b_, {s1, s2}), c_ = AddGroup("C", 0, {});
+    for (uint32_t f : {r1, o1}) {
       SXMPRecord rec;
-      rec.Oid = f;
-      rec.Rating = 3;
-      rec.Label = f == r1() ? "Red" : "";
+      rec.Oid = f, rec.Rating = 3, rec.Label = f == r1 ? "Red" : "";
       ASSERT_EQ(engine_.XMPDB().Set(rec, false), 0);
     }
   }
-  uint32_t r1() const { return f_[0]; }
-  uint32_t r2() const { return f_[1]; }
-  uint32_t s1() const { return f_[2]; }
-  uint32_t s2() const { return f_[3]; }
-  uint32_t o1() const { return f_[4]; }
-  uint32_t o2() const { return f_[5]; }
-
   unsigned Formula(uint32_t oid, const std::string& text) {
     CVXGroup g = Group(oid);
     SError e = g.SetExpression(Cat(), text);
@@ -62,8 +41,7 @@ class Calc : public vxtest::CatalogFixture {
   // Stores a formula naming `target`, past the checks of SetExpression, as an old catalog may.
   void ForceFormula(uint32_t oid, uint32_t target) {
     SExpr e;
-    e.Type = ttCategory;
-    e.Oid = target;
+    e.Type = ttCategory, e.Oid = target;
     CVXGroup g = Group(oid);
     g.Postfix() = g.Infix() = {e};
     Store(g);
@@ -74,54 +52,53 @@ class Calc : public vxtest::CatalogFixture {
     return out;
   }
 
-  Oids f_;
   uint32_t a_, b_, b1_, c_;
 };
 
 TEST_F(Calc, EveryOperandTypeAgainstTheCatalog) {
   const std::string pics = "file://c:/pics/<VOL.1234>";
   const std::pair<std::string, Oids> cases[] = {
-      {R"("A")", {r1(), s1()}},
-      {R"("B")", {r2(), s1(), s2()}},  // children merged
-      {R"("Category@B.B1")", {s1(), s2()}},
-      {R"("CatNoRecurse@B")", {r2()}},
-      {R"("CatDistinct@A")", {r1()}},  // s1 is also assigned to B1
-      {R"("Folder@)" + pics + "\"", {r1(), r2()}},
-      {R"("RFolder@)" + pics + "\"", {r1(), r2(), s1(), s2()}},
-      {R"("Folder@d:\other")", {o1(), o2()}},  // no suffix: the folder without media
-      {R"("@Unassigned")", {o1(), o2()}},
-      {R"("@Rating[ 3 ]")", {r1(), o1()}},
-      {R"("@Rating[0]")", {r2(), s1(), s2(), o2()}},
-      {R"("@Label[red]")", {r1()}},
-      {R"("@All")", f_},
+      {R"("A")", {r1, s1}},
+      {R"("B")", {r2, s1, s2}},  // children merged
+      {R"("Category@B.B1")", {s1, s2}},
+      {R"("CatNoRecurse@B")", {r2}},
+      {R"("CatDistinct@A")", {r1}},  // s1 is also assigned to B1
+      {R"("Folder@)" + pics + "\"", {r1, r2}},
+      {R"("RFolder@)" + pics + "\"", {r1, r2, s1, s2}},
+      {R"("Folder@d:\other")", {o1, o2}},  // no suffix: the folder without media
+      {R"("@Unassigned")", {o1, o2}},
+      {R"("@Rating[ 3 ]")", {r1, o1}},
+      {R"("@Rating[0]")", {r2, s1, s2, o2}},
+      {R"("@Label[red]")", {r1}},
+      {R"("@All")", kFiles},
       {R"("A" NOT "A")", {}},
       // No precedence: (A OR B) AND folder, never A OR (B AND folder).
-      {R"("A" OR "B" AND "Folder@)" + pics + "\"", {r1(), r2()}},
-      {"(\"A\" OR \"@Label[Red]\")\r\nAND (\"RFolder@" + pics + "\" NOT \"Category@B\")", {r1()}},
+      {R"("A" OR "B" AND "Folder@)" + pics + "\"", {r1, r2}},
+      {"(\"A\" OR \"@Label[Red]\")\r\nAND (\"RFolder@" + pics + "\" NOT \"Category@B\")", {r1}},
   };
   for (const auto& [formula, expected] : cases) {
     SCOPED_TRACE(formula);
     ASSERT_EQ(Formula(c_, formula), VX_OK);
     EXPECT_EQ(Content(c_), expected);
   }
-  EXPECT_EQ(Content(VX_ALL_GROUP_OID), f_);
+  EXPECT_EQ(Content(VX_ALL_GROUP_OID), kFiles);
 }
 
 // Content is assigned files, formula and children. gfNoChildImages reads the category being
 // calculated: alone it keeps its own files, reached from a parent it merges its children.
 TEST_F(Calc, ImagesFormulaChildrenAndNoChildImages) {
-  uint32_t p = AddGroup("P", c_, {o1()});
-  AddGroup("Q", p, {o2()});
+  uint32_t p = AddGroup("P", c_, {o1});
+  AddGroup("Q", p, {o2});
   CVXGroup g = Group(p);
   g.Flags() |= gfNoChildImages;
   Store(g);
-  EXPECT_EQ(Content(p), Oids{o1()});
+  EXPECT_EQ(Content(p), Oids{o1});
   ASSERT_EQ(Formula(c_, R"("CatNoRecurse@A")"), VX_OK);
-  EXPECT_EQ(Content(c_), (Oids{r1(), s1(), o1(), o2()}));
+  EXPECT_EQ(Content(c_), (Oids{r1, s1, o1, o2}));
   ASSERT_EQ(Formula(p, R"("CatNoRecurse@B")"), VX_OK);
-  EXPECT_EQ(Content(p), (Oids{r2(), o1(), o2()})) << "with a formula the flag does nothing";
-  EXPECT_TRUE(Group(c_).HasImage(Cat(), r1()));
-  EXPECT_FALSE(Group(c_).HasImage(Cat(), s2()));
+  EXPECT_EQ(Content(p), (Oids{r2, o1, o2})) << "with a formula the flag does nothing";
+  EXPECT_TRUE(Group(c_).HasImage(Cat(), r1));
+  EXPECT_FALSE(Group(c_).HasImage(Cat(), s2));
 }
 
 TEST_F(Calc, FailuresAndTheirCodes) {
@@ -150,20 +127,18 @@ TEST_F(Calc, FailuresAndTheirCodes) {
   // A missing child stops the walk with 10020, keeps what was computed, marks nothing.
   ASSERT_EQ(Formula(c_, ""), VX_OK);
   CVXGroup c = Group(c_);
-  c.Images().Set(o1());
+  c.Images().Set(o1);
   c.Children() = {a_, 4242, b_};
   CBitVector bits;
   EXPECT_EQ(c.Calculate(Cat(), bits), VX_NOT_FOUND);
   EXPECT_FALSE(c.InError());
-  EXPECT_EQ(bits, CBitVector(std::vector<unsigned long>{r1(), s1(), o1()}));
+  EXPECT_EQ(bits, CBitVector(std::vector<unsigned long>{r1, s1, o1}));
 }
 
 // Every loop ends with 15014, whether it passes through the calculated category or lies below
 // it, through Children, through formulas, or through both.
 TEST_F(Calc, LoopsEndWithCircular) {
-  uint32_t x = AddGroup("X", 0, {o1()});
-  uint32_t y = AddGroup("Y", x, {o2()});
-  uint32_t z = AddGroup("Z", 0, {});
+  uint32_t x = AddGroup("X", 0, {o1}), y = AddGroup("Y", x, {o2}), z = AddGroup("Z", 0, {});
   CVXGroup g = Group(y);
   g.Children().push_back(x);  // X -> Y -> X
   Store(g);
@@ -195,30 +170,28 @@ TEST_F(Calc, LoopsEndWithCircular) {
 }
 
 TEST_F(Calc, DataDrivenCategoryQueriesOnceAndCaches) {
-  for (uint32_t f : {r1(), o1()}) ASSERT_EQ(engine_.XMPDB().FTISetU(f, {{"XMP:City", "Paris"}}), 0);
-  ASSERT_EQ(engine_.XMPDB().FTISetU(r2(), {{"XMP:City", "Rome"}}), 0);
+  for (uint32_t f : {r1, o1}) ASSERT_EQ(engine_.XMPDB().FTISetU(f, {{"XMP:City", "Paris"}}), 0);
+  ASSERT_EQ(engine_.XMPDB().FTISetU(r2, {{"XMP:City", "Rome"}}), 0);
   CVXGroup k(Cat().GenerateGroupOID());
-  k.Name() = "Paris";
-  k.FTITag() = "XMP:City";
-  k.FTIPattern() = "Paris";
+  k.Name() = "Paris", k.FTITag() = "XMP:City", k.FTIPattern() = "Paris";
   k.Flags() = gfNeedsRecalc;
-  k.Images().Set(o2());  // out of date: replaced by the query
+  k.Images().Set(o2);  // out of date: replaced by the query
   ASSERT_EQ(Cat().AddGroup(k), VX_OK);
 
   CVXGroup copy = Group(k.Oid());
   CBitVector bits;
   ASSERT_EQ(copy.Calculate(Cat(), bits), VX_OK);
-  EXPECT_EQ(bits, CBitVector(std::vector<unsigned long>{r1(), o1()}));
+  EXPECT_EQ(bits, CBitVector(std::vector<unsigned long>{r1, o1}));
   EXPECT_TRUE(copy.NeedsRecalc()) << "the caller's copy keeps its flag";
   CVXGroup cached = Group(k.Oid());
   EXPECT_FALSE(cached.NeedsRecalc());
   EXPECT_EQ(cached.Images(), bits);
 
   // From now on the cache answers, without files that do not exist.
-  ASSERT_EQ(engine_.XMPDB().FTISetU(r2(), {{"XMP:City", "Paris"}}), 0);
+  ASSERT_EQ(engine_.XMPDB().FTISetU(r2, {{"XMP:City", "Paris"}}), 0);
   cached.Images().Set(999);
   Store(cached);
-  EXPECT_EQ(Content(k.Oid()), (Oids{r1(), o1()}));
+  EXPECT_EQ(Content(k.Oid()), (Oids{r1, o1}));
 }
 
 }  // namespace

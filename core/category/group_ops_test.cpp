@@ -1,16 +1,6 @@
 #include <gtest/gtest.h>
 
-#include <string>
-#include <vector>
-
-#include "VXEngine.h"
-#include "VXFolder.h"
-#include "VXGroup.h"
-#include "VXResult.h"
-#include "VXURI.h"
-#include "vxcatalog.h"
 #include "vxcatalog_fixture.h"
-#include "vxtest.h"
 
 namespace {
 
@@ -21,13 +11,9 @@ class GroupOps : public vxtest::CatalogFixture {
  protected:
   void SetUp() override {
     CatalogFixture::SetUp();
-    pics_ = AddFolder("c:/pics", "VOL", "1234");
-    other_ = AddFolder("d:/other", "", "");
-    top_ = AddGroup("Top", 0);
-    left_ = AddGroup("Left", top_);
-    right_ = AddGroup("Right", top_);
-    deep_ = AddGroup("Deep", right_);
-    otherGroup_ = AddGroup("Other", 0);
+    pics_ = AddFolder("c:/pics", "VOL", "1234"), other_ = AddFolder("d:/other", "", "");
+    top_ = AddGroup("Top", 0), left_ = AddGroup("Left", top_), right_ = AddGroup("Right", top_);
+    deep_ = AddGroup("Deep", right_), otherGroup_ = AddGroup("Other", 0);
   }
 
   unsigned AddImage(uint32_t group, uint32_t file, uint32_t flags = 0) {
@@ -191,8 +177,7 @@ TEST_F(GroupOps, ReferenceTests) {
 
   // Left and Right both name Top, their parent: each would examine the other without end.
   SExpr toTop;
-  toTop.Type = ttCategory;
-  toTop.Oid = top_;
+  toTop.Type = ttCategory, toTop.Oid = top_;
   for (uint32_t oid : {left_, right_}) {
     CVXGroup loop = Group(oid);
     loop.Postfix() = {toTop};

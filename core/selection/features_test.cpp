@@ -97,14 +97,14 @@ TEST(SelFeatures, FolderAndCategoryStreams) {
 
 TEST(SelFeatures, FileNameStreamKeepsNeedsOriginalsInStepWithMode) {
   auto r = Fresh<SSelFileName>();
-  r.Mode = 1, r.Pattern = "IMG_*.jpg", r.Invert = 1;
-  ExpectRecord(r, Head(2, "SFN", true, true).u32(1).str("IMG_*.jpg").u32(1));
+  r.Mode = 1, r.Pattern = "IMG_*.jpg", r.Invert = 7;
+  ExpectRecord(r, Head(2, "SFN", true, true).u32(1).str("IMG_*.jpg").u32(7));
 
   // Store sets the flag from Mode, and so does Load whatever the core block says.
   r.Mode = 2, r.NeedsOriginals = true;
   std::vector<uint8_t> bytes = Stored(r);
-  EXPECT_EQ(bytes[9], 0);  // NeedsOriginals of the core block
-  bytes[9] = 1;
+  EXPECT_EQ(bytes[10], 0);  // NeedsOriginals of the core block, after version, tag and Active
+  bytes[10] = 1;
   EXPECT_FALSE(Loaded<SSelFileName>(bytes).NeedsOriginals);
 
   Bytes v1 = Head(1, "SFN").u32(0).str("x");
@@ -145,17 +145,17 @@ TEST(SelFeatures, FormatSizeDateAndDimensionStreamsAndResetDates) {
 }
 
 Bytes LimitsStream(uint16_t version, uint32_t maxResults) {
-  Bytes b = Head(version, "SLM").u32(1).u32(0).u32(60).u32(50).u32(maxResults).u32(1);
-  if (version >= 2) b.u32(1);
+  Bytes b = Head(version, "SLM").u32(2).u32(0).u32(60).u32(50).u32(maxResults).u32(3);
+  if (version >= 2) b.u32(4);
   return b;
 }
 
 TEST(SelFeatures, LimitsStreamAndMaxResultsFixUps) {
   EXPECT_EQ(SSelLimits().MaxResults, 0u);  // a fresh record is not reset
   auto r = Fresh<SSelLimits>();
-  r.ExactDuplicates = 1, r.Mode = 0, r.MinScore = 60, r.MaxResults = 1, r.DropEmpty = 1;
-  r.PropsAny = 1;
-  Bytes block = LimitsStream(3, 1);
+  r.ExactDuplicates = 2, r.Mode = 0, r.MinScore = 60, r.MaxResults = 7, r.DropEmpty = 3;
+  r.PropsAny = 4;
+  Bytes block = LimitsStream(3, 7);
   ExpectRecord(r, SampleCore().raw(block.b.data(), block.b.size()));
 
   auto maxResults = [](uint16_t version, uint32_t stored) {
@@ -167,8 +167,8 @@ TEST(SelFeatures, LimitsStreamAndMaxResultsFixUps) {
   EXPECT_EQ(maxResults(1, 1), 1u);
   SSelLimits old = Loaded<SSelLimits>(LimitsStream(1, 7).b, false);
   EXPECT_EQ(old.PropsAny, 0u);
-  EXPECT_EQ(old.ExactDuplicates, 1u);
-  EXPECT_EQ(old.DropEmpty, 1u);
+  EXPECT_EQ(old.ExactDuplicates, 2u);
+  EXPECT_EQ(old.DropEmpty, 3u);
 }
 
 TEST(SelFeatures, ColorAndMaskReadTheirFixedSizeWhateverTheCount) {
@@ -201,9 +201,9 @@ TEST(SelFeatures, ColorAndMaskReadTheirFixedSizeWhateverTheCount) {
 
 TEST(SelFeatures, MatchStreamStartsFromReset) {
   auto r = Fresh<SSelMatch>();
-  r.Method = 1, r.Precision = 1, r.Weighting = 3, r.LumaWeight = 10, r.ColorWeight = 40;
-  r.Rotate = true, r.Fast = true;
-  ExpectRecord(r, Head(2, "SDMA", true).u32(1).u32(1).u32(3).u32(10).u32(40).u32(1).u32(1));
+  r.Method = 2, r.Precision = 1, r.Weighting = 3, r.LumaWeight = 10, r.ColorWeight = 40;
+  r.Rotate = false, r.Fast = true;
+  ExpectRecord(r, Head(2, "SDMA", true).u32(2).u32(1).u32(3).u32(10).u32(40).u32(0).u32(1));
 
   // Version 1 has no Fast. Without the core block the core comes back as Reset leaves it.
   Bytes v1 = Head(1, "SDMA").u32(0).u32(0).u32(0).u32(0).u32(0).u32(5);

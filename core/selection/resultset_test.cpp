@@ -15,39 +15,43 @@ using seltest::Bytes;
 using seltest::Streamed;
 using Ref = CVXResultSet::ERefType;
 
+// The file record's OID is the entry's unless `fileOid` says otherwise.
 SVXResultSetEntry Entry(uint32_t number, uint32_t oid, uint32_t folder, const std::string& uri,
-                        std::vector<SVXRSEntry> hits) {
+                        std::vector<SVXRSEntry> hits, uint32_t fileOid = UINT32_MAX) {
   SVXResultSetEntry e;
   e.Number = number, e.OID = oid, e.Folder = folder;
   e.URI.Set(uri, false);
-  e.File = CVXCatFile(oid, e.URI.FileName(), folder);
+  e.File = CVXCatFile(fileOid == UINT32_MAX ? oid : fileOid, e.URI.FileName(), folder);
   e.File.Properties().Processed = e.File.Properties().FileTime = 0;
   e.Hits = std::move(hits);
   return e;
 }
 
-// Two originals, the second external; numbers with a gap.
+// Two originals, the second external; numbers with a gap. Neighbouring fields hold values of
+// their own (a file record OID apart from the entry's, a URI type that is not 0), so that fields
+// written in the wrong order show.
 CVXResultSet Sample() {
   CVXResultSet rs(0x77);
   rs.Properties().Name = "Res";
   rs.Properties().Comment = "c";
-  rs.Properties().Entries = {Entry(1, 10, 2, "file:///p/a.jpg", {{20, 3, 99.5}, {21, 4, 50.25}}),
-                             Entry(3, 0, 0, "file:///ext/B.jpg", {})};
+  rs.Properties().Entries = {
+      Entry(1, 10, 2, "file:///p/a.jpg", {{20, 3, 99.5}, {21, 4, 50.25}}, 31),
+      Entry(3, 0, 0, "http://ext/B.jpg", {})};
   return rs;
 }
 
-void EntryBytes(Bytes& b, uint32_t number, uint32_t oid, uint32_t folder, const std::string& uri,
-                const std::string& name) {
-  b.u32(number).u32(oid).u32(CVXURI::File).le(uint8_t{0}).str(uri);
-  b.u16(1).u32(oid).u16(3).str(name).u32(folder).b.resize(b.b.size() + 62);
+void EntryBytes(Bytes& b, uint32_t number, uint32_t oid, uint32_t folder, CVXURI::EType type,
+                const std::string& uri, uint32_t fileOid, const std::string& name) {
+  b.u32(number).u32(oid).u32(type).le(uint8_t{0}).str(uri);
+  b.u16(1).u32(fileOid).u16(3).str(name).u32(folder).b.resize(b.b.size() + 62);
 }
 
 std::vector<uint8_t> SampleBytes() {
   Bytes b;
   b.u16(1).u32(0x77).u16(1).str("Res").str("c").u32(2);
-  EntryBytes(b, 1, 10, 2, "file:///p/a.jpg", "a.jpg");
+  EntryBytes(b, 1, 10, 2, CVXURI::File, "file:///p/a.jpg", 31, "a.jpg");
   b.u32(2).u32(20).le(std::bit_cast<uint64_t>(99.5)).u32(21).le(std::bit_cast<uint64_t>(50.25));
-  EntryBytes(b, 3, 0, 0, "file:///ext/B.jpg", "B.jpg");
+  EntryBytes(b, 3, 0, 0, CVXURI::Http, "http://ext/B.jpg", 0, "B.jpg");
   b.u32(0);
   return b.b;
 }
@@ -83,9 +87,9 @@ TEST(ResultSet, ReferencesLookAtTheEntryBeforeItsHits) {
   EXPECT_EQ(ref, CVXResultSet::rtHit);
   EXPECT_FALSE(rs.HasReference(99, ref));
   ref = CVXResultSet::rtHit;
-  EXPECT_TRUE(rs.HasReference(CVXURI("file:///EXT/b.JPG", false), ref));
+  EXPECT_TRUE(rs.HasReference(CVXURI("http://EXT/b.JPG", false), ref));
   EXPECT_EQ(ref, CVXResultSet::rtOriginal);
-  EXPECT_FALSE(rs.HasReference(CVXURI("file:///ext/b.jpg", true), ref));
+  EXPECT_FALSE(rs.HasReference(CVXURI("http://ext/b.jpg", true), ref));
 
   std::vector<unsigned long> originals = {42};
   rs.GetOriginals(originals);
