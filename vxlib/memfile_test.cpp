@@ -46,16 +46,11 @@ TEST(MemFile, IntegersAndStringsAgainstTheirBytes) {
                    0,    0xF0, 0x3F, 3,    0,    0,    0,    'h',  0xC3, 0xA9, 3,    0,
                    0,    0,    'a',  0,    0xFF, 0,    0,    0,    0}));
   f.Rewind();
-  uint8_t a;
-  uint16_t b;
-  uint32_t c;
-  int32_t d;
-  uint64_t e;
-  double g;
+  std::tuple<uint8_t, uint16_t, uint32_t, int32_t, uint64_t, double> numbers;
+  auto& [a, b, c, d, e, g] = numbers;
   std::string s1, s2, s3 = "x";
   f >> a >> b >> c >> d >> e >> g >> s1 >> s2 >> s3;
-  EXPECT_EQ(std::tuple(a, b, c, d, e, g),
-            std::tuple(0x11, 0x2233, 0x44556677u, -2, 0x0102030405060708u, 1.0));
+  EXPECT_EQ(numbers, std::tuple(0x11, 0x2233, 0x44556677u, -2, 0x0102030405060708u, 1.0));
   EXPECT_EQ(std::tuple(s1, s2, s3), std::tuple("hé", binary, ""));
   EXPECT_EQ(f.GetPosition(), f.GetFileSize());
 }

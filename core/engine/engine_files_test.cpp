@@ -1,7 +1,6 @@
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
-#include <cstring>
 #include <string>
 #include <vector>
 
@@ -16,6 +15,18 @@ using vxtest::MakeRow;
 using vxtest::MakeShape;
 using vxtest::MakeThumb;
 
+std::vector<uint8_t> Bytes(const SVXDBRec_3& record) {
+  auto* p = reinterpret_cast<const uint8_t*>(&record);
+  return {p, p + sizeof record};
+}
+
+// Record 2/OID of a file added from a bitmap: a zero flag byte, then the bitmap's shape data.
+std::vector<uint8_t> ShapeOf(const CVXBitmap& bitmap) {
+  SVXDBRec_3 record{};
+  EXPECT_TRUE(CShape().CalcShapeInfo(bitmap, record.Info, 127));
+  return Bytes(record);
+}
+
 class EngineFilesTest : public vxtest::EngineFixture {
  protected:
   void SetUp() override {
@@ -25,33 +36,34 @@ class EngineFilesTest : public vxtest::EngineFixture {
     other_ = AddFolder("c:/other/");
   }
 
-  uint32_t AddGroup(const std::string& name, const std::vector<uint32_t>& files) {
-    CVXGroup group(engine_.Catalog().GenerateGroupOID());
-    group.Name() = name;
-    for (uint32_t f : files) group.Images().Set(f);
-    EXPECT_EQ(engine_.Catalog().AddGroup(group), VX_OK);
-    return group.Oid();
-  }
-
-  std::vector<uint32_t> Groups(uint32_t oid) {
-    std::vector<uint32_t> groups;
-    EXPECT_EQ(engine_.GetFileGroups(oid, groups), VX_OK);
-    return groups;
-  }
-
-  std::vector<CVXProperty> Properties(uint32_t oid) {
-    std::vector<CVXProperty> row;
-    engine_.GetImageProperties(oid, row);
-    return row;
-  }
-
   // A file with data in every store: shape, thumbnail, properties, XMP and a category.
   uint32_t AddFullFile(uint32_t folder, const std::string& name, uint32_t seed) {
     uint32_t oid = AddFile(folder, name, seed);
     EXPECT_EQ(engine_.AddImageProperties(oid, MakeRow(seed, 2)), VX_OK);
     SetXMP(oid, name);
-    AddGroup("g" + name, {oid});
+    CVXGroup group(engine_.Catalog().GenerateGroupOID());
+    group.Name() = "g" + name;
+    group.Images().Set(oid);
+    EXPECT_EQ(engine_.Catalog().AddGroup(group), VX_OK);
     return oid;
+  }
+
+  // What the stores hold of a file besides its catalog record.
+  struct SData {
+    std::vector<uint8_t> shape, thumb;
+    std::vector<CVXProperty> properties;
+    std::string xmp;
+    std::vector<uint32_t> groups;
+    bool operator==(const SData&) const = default;
+  };
+  SData Data(uint32_t oid) {
+    SData data{ShapeBytes(oid), {}, {}, XMPPacket(oid), {}};
+    CVXThumb thumb;
+    engine_.GetThumb(oid, thumb);
+    data.thumb.assign(thumb.Data(), thumb.Data() + thumb.DataSize());
+    engine_.GetImageProperties(oid, data.properties);
+    EXPECT_EQ(engine_.GetFileGroups(oid, data.groups), VX_OK);
+    return data;
   }
 
   // True when no store but the catalog holds anything of `oid`.
@@ -65,46 +77,43 @@ class EngineFilesTest : public vxtest::EngineFixture {
   uint32_t other_ = 0;
 };
 
-TEST_F(EngineFilesTest, AddFileComputesShapeDataAndUpdatesByNameIgnoringCase) {
-  CVXBitmap bitmap = MakeBitmap(30, 20, 5, true);
-  CVXCatFile file(0, "Img1.JPG", pics_);
-  file.Properties().Processed = 0;
+TEST_F(EngineFilesTest, AddFileComputesShapeDataOfAnyBitmapAndUpdatesByNameIgnoringCase) {
+  const uint32_t bitmaps[][3] = {
+      {1, 1, 0}, {70000, 1, 0}, {1, 70000, 0}, {3, 50001, 0}, {30, 20, 1}};
   log_.ClearCaptured();
-  ASSERT_EQ(engine_.AddFile(file, bitmap, 0xC0FFEE), VX_OK);
-  uint32_t oid = file.Oid();
-  EXPECT_NE(oid, 0u);
-  EXPECT_EQ(file.Properties().CRC, 0xC0FFEEu);
-  EXPECT_NE(file.Properties().Processed, 0);
-  EXPECT_TRUE(file.IsGreyscale());
+  for (const auto& [w, h, grey] : bitmaps) {
+    CVXBitmap bitmap = MakeBitmap(w, h, w + h, grey);
+    CVXCatFile file(0, std::to_string(w) + "x" + std::to_string(h), pics_);
+    file.Properties().Processed = 0;
+    ASSERT_EQ(engine_.AddFile(file, bitmap, 0xC0FFEE), VX_OK) << file.Name();
+    EXPECT_EQ(file.Properties().CRC, 0xC0FFEEu);
+    EXPECT_NE(file.Properties().Processed, 0);
+    EXPECT_EQ(file.IsGreyscale(), grey != 0);
+    EXPECT_EQ(File(file.Oid()).Properties().CRC, 0xC0FFEEu);
+    EXPECT_EQ(ShapeBytes(file.Oid()), ShapeOf(bitmap)) << file.Name();
+  }
   for (const char* line : {"+ VXEngine::AddFile", "+ VXEngine::PF", "Insert", "- VXEngine::PF",
                            "- VXEngine::AddFile"}) {
     EXPECT_TRUE(log_.HasLine(line)) << line;
   }
 
-  // Record 2/OID: a zero flag byte, then the shape calculation of the bitmap.
-  SVXDBRec_3 expected{};
-  CShape shape;
-  shape.CalcShapeInfo(bitmap, expected.Info, 127);
-  std::vector<uint8_t> stored = ShapeBytes(oid);
-  ASSERT_EQ(stored.size(), 1601u);
-  EXPECT_EQ(stored[0], 0);
-  EXPECT_EQ(std::memcmp(stored.data(), &expected, sizeof expected), 0);
-  EXPECT_EQ(File(oid).Properties().CRC, 0xC0FFEEu);
-
-  // The same name in other case updates that file under its OID, in colour now.
-  CVXCatFile again(0, "img1.jpg", pics_);
+  // The same name in other case updates the last file under its OID, in colour now.
+  uint32_t oid = engine_.Catalog().Header().LastFileOid;
+  CVXCatFile again(0, "30X20", pics_);
   again.Properties().Flags = cfGreyscale;
+  CVXBitmap colour = MakeBitmap(30, 20, 6);
   log_.ClearCaptured();
-  ASSERT_EQ(engine_.AddFile(again, MakeBitmap(30, 20, 6), 7), VX_OK);
+  ASSERT_EQ(engine_.AddFile(again, colour, 7), VX_OK);
   EXPECT_EQ(again.Oid(), oid);
   EXPECT_TRUE(log_.HasLine("Update"));
   EXPECT_FALSE(again.IsGreyscale());
-  EXPECT_NE(ShapeBytes(oid), stored);
+  EXPECT_EQ(ShapeBytes(oid), ShapeOf(colour));
   EXPECT_EQ(File(oid).Properties().CRC, 7u);
-  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
+  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), std::size(bitmaps));
 }
 
-TEST_F(EngineFilesTest, AddFileIntoAnUnknownFolderLeavesNothingBehind) {
+// Adds and copies that fail spend the new OID but leave nothing under it.
+TEST_F(EngineFilesTest, FailedAddsAndCopiesLeaveNothingBehind) {
   CVXCatFile file(0, "a.jpg", 999);
   EXPECT_EQ(engine_.AddFile(file, MakeBitmap(8, 8, 1), 0), VX_NOT_FOUND);
   EXPECT_NE(file.Oid(), 0u) << "a new OID was taken";
@@ -117,42 +126,35 @@ TEST_F(EngineFilesTest, AddFileIntoAnUnknownFolderLeavesNothingBehind) {
   EXPECT_TRUE(log_.Has("Index corrupted. Run Diagnosis & Repair!"));
   EXPECT_TRUE(Gone(ready.Oid()));
   EXPECT_GT(ready.Oid(), file.Oid());
-}
 
-TEST_F(EngineFilesTest, AnyBitmapWithPixelsIsProcessedAndAnEmptyOneRefused) {
-  const uint32_t sizes[][2] = {{1, 1}, {70000, 1}, {1, 70000}, {3, 50001}};
-  CShape shape;
-  for (const auto& s : sizes) {
-    CVXBitmap bitmap = MakeBitmap(s[0], s[1], s[0] + s[1]);
-    CVXCatFile file(0, std::to_string(s[0]) + "x" + std::to_string(s[1]), pics_);
-    ASSERT_EQ(engine_.AddFile(file, bitmap, 1), VX_OK) << file.Name();
-    SVXDBRec_3 expected{};
-    ASSERT_TRUE(shape.CalcShapeInfo(bitmap, expected.Info, 127));
-    std::vector<uint8_t> stored = ShapeBytes(file.Oid());
-    ASSERT_EQ(stored.size(), sizeof expected);
-    EXPECT_EQ(std::memcmp(stored.data(), &expected, sizeof expected), 0) << file.Name();
-  }
-
-  // No pixels: a code, no shape record, no catalog record; the new OID is spent.
+  // No pixels: no shape record, no catalog record.
   CVXCatFile empty(0, "empty.jpg", pics_);
   log_.ClearCaptured();
   EXPECT_EQ(engine_.AddFile(empty, CVXBitmap(), 1), VX_NOT_FOUND);
   EXPECT_TRUE(log_.Has("Preprocess failed"));
-  EXPECT_NE(empty.Oid(), 0u);
+  EXPECT_GT(empty.Oid(), ready.Oid());
   EXPECT_TRUE(Gone(empty.Oid()));
   CVXCatFile noRows(0, "norows.jpg", pics_);
   EXPECT_EQ(engine_.AddFile(noRows, CVXBitmap(500, 0), 1), VX_NOT_FOUND);
+  EXPECT_TRUE(Gone(noRows.Oid()));
 
-  // SetFile with an empty bitmap keeps the shape data and the record as they were.
-  uint32_t oid = AddFile(pics_, "kept.jpg", 3);
-  std::vector<uint8_t> before = ShapeBytes(oid);
-  CVXCatFile file = File(oid);
-  file.Properties().Size = 99;
-  CVXBitmap none;
-  EXPECT_EQ(engine_.SetFile(file, &none, 5), VX_NOT_FOUND);
-  EXPECT_TRUE(log_.Has("Processing file in SetFile"));
-  EXPECT_EQ(ShapeBytes(oid), before);
-  EXPECT_NE(File(oid).Properties().Size, 99u);
+  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  unsigned long copy = 77;
+  EXPECT_EQ(engine_.CopyFile(a, 999, copy, "x.jpg", false), VX_NOT_FOUND);
+  EXPECT_EQ(copy, 0u);
+  EXPECT_EQ(engine_.CopyFile(999, other_, copy, "x.jpg", false), VX_NOT_FOUND);
+
+  // The property store refuses to write: the copy fails after its shape data and thumbnail
+  // went in, and they go again with the catalog record.
+  uint32_t next = engine_.Catalog().Header().LastFileOid + 1;
+  sqlite3* props = engine_.GetPropertyDatabase().BlobDB().Handle();
+  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=1", nullptr, nullptr, nullptr), SQLITE_OK);
+  EXPECT_NE(engine_.CopyFile(a, other_, copy, "x.jpg", false), VX_OK);
+  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=0", nullptr, nullptr, nullptr), SQLITE_OK);
+  EXPECT_EQ(copy, 0u);
+  EXPECT_TRUE(Gone(next));
+  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
+  EXPECT_FALSE(Gone(a));
 }
 
 TEST_F(EngineFilesTest, AddFileFromThumbAndShapeAddsAndUpdates) {
@@ -163,13 +165,12 @@ TEST_F(EngineFilesTest, AddFileFromThumbAndShapeAddsAndUpdates) {
   uint32_t oid = file.Oid();
   EXPECT_EQ(thumb.Oid(), oid);
   EXPECT_NE(File(oid).Properties().Processed, 0) << "the stored record carries the time";
-  SVXDBRec_3 shape = MakeShape(9);
-  EXPECT_EQ(ShapeBytes(oid), std::vector<uint8_t>(reinterpret_cast<uint8_t*>(&shape),
-                                                  reinterpret_cast<uint8_t*>(&shape) + 1601));
+  EXPECT_EQ(ShapeBytes(oid), Bytes(MakeShape(9)));
   CVXCatFile same(0, "X.PNG", pics_);
   CVXThumb wide = MakeThumb(640, 48, 30, 3);
   ASSERT_EQ(engine_.AddFile(same, wide, MakeShape(10)), VX_OK);
   EXPECT_EQ(same.Oid(), oid);
+  EXPECT_EQ(ShapeBytes(oid), Bytes(MakeShape(10)));
   CVXThumb back;
   ASSERT_EQ(engine_.GetThumb(oid, back), VX_OK);
   EXPECT_EQ(back.Width(), 640u);
@@ -203,32 +204,29 @@ TEST_F(EngineFilesTest, MutationsNeedAnOpenWritableEngine) {
   EXPECT_EQ(engine_.AddFile(file, MakeBitmap(4, 4, 1), 0), VX_NOT_MUTABLE);
 }
 
-TEST_F(EngineFilesTest, RemoveFileClearsEveryStoreAndToleratesMissingData) {
+TEST_F(EngineFilesTest, RemovalsClearEveryStoreAndTolerateMissingData) {
+  uint32_t sub = AddFolder("c:/pics/sub/");
   uint32_t a = AddFullFile(pics_, "a.jpg", 1);
-  uint32_t b = AddFullFile(pics_, "b.jpg", 2);
-  ASSERT_EQ(engine_.RemoveFile(a), VX_OK);
-  EXPECT_TRUE(Gone(a));
-  EXPECT_TRUE(Groups(a).empty());
-  EXPECT_FALSE(Gone(b));
+  uint32_t b = AddFullFile(sub, "b.jpg", 2);
+  uint32_t keep = AddFullFile(other_, "c.jpg", 3);
+  uint32_t gone = AddFullFile(other_, "d.jpg", 4);
+  ASSERT_EQ(engine_.RemoveFile(gone), VX_OK);
+  EXPECT_TRUE(Gone(gone));
+  EXPECT_TRUE(Data(gone).groups.empty());
+  EXPECT_FALSE(Gone(keep));
+  EXPECT_EQ(engine_.RemoveFile(12345), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("VXEngine::RemoveFile"));
 
   // A file without shape data or thumbnail still leaves the catalog.
   CVXCatFile bare(engine_.Catalog().GenerateFileOID(), "bare.jpg", pics_);
   ASSERT_EQ(engine_.Catalog().AddFile(pics_, bare), VX_OK);
   EXPECT_EQ(engine_.RemoveFile(bare.Oid()), VX_OK);
   EXPECT_TRUE(engine_.Catalog().IsUniqueFileOID(bare.Oid()));
-  EXPECT_EQ(engine_.RemoveFile(12345), VX_NOT_FOUND);
-  EXPECT_TRUE(log_.Has("VXEngine::RemoveFile"));
-}
 
-TEST_F(EngineFilesTest, RemoveFolderTakesSubFoldersAndTheirFilesFromEveryStore) {
-  uint32_t sub = AddFolder("c:/pics/sub/");
-  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
-  uint32_t b = AddFullFile(sub, "b.jpg", 2);
-  uint32_t keep = AddFullFile(other_, "c.jpg", 3);
-  // A file that never got a thumbnail does not hold the folder back.
+  // A folder goes with its sub-folders and their files; one that never got a thumbnail does
+  // not hold it back.
   CVXCatFile noThumb(0, "n.jpg", sub);
   ASSERT_EQ(engine_.AddFile(noThumb, MakeBitmap(4, 4, 1), 0), VX_OK);
-
   ASSERT_EQ(engine_.RemoveFolder(pics_), VX_OK);
   for (uint32_t oid : {a, b, noThumb.Oid()}) EXPECT_TRUE(Gone(oid)) << oid;
   CVXFolder folder;
@@ -263,93 +261,57 @@ TEST_F(EngineFilesTest, RemoveFolderRollsBackXMPWhenTheCatalogKeepsTheFolder) {
 TEST_F(EngineFilesTest, MoveFileKeepsTheOidAndReplacesATarget) {
   uint32_t a = AddFullFile(pics_, "a.jpg", 1);
   uint32_t b = AddFullFile(other_, "b.jpg", 2);
-  std::vector<uint8_t> shapeA = ShapeBytes(a);
-  std::vector<uint32_t> groupsA = Groups(a);
+  SData data = Data(a);
 
   // Onto b's name without taking over: a keeps its own data, b is gone from every store.
   ASSERT_EQ(engine_.MoveFile(a, other_, "B.JPG", false), VX_OK);
   EXPECT_EQ(File(a).Properties().Folder, other_);
   EXPECT_EQ(File(a).Name(), "B.JPG");
   EXPECT_TRUE(Gone(b));
-  EXPECT_EQ(ShapeBytes(a), shapeA);
-  EXPECT_EQ(Properties(a), MakeRow(1, 2));
-  EXPECT_EQ(XMPPacket(a), "a.jpg");
-  EXPECT_EQ(Groups(a), groupsA);
+  EXPECT_EQ(Data(a), data);
 
   // Taking over: the moved file gets the target's properties and categories.
   uint32_t c = AddFullFile(pics_, "c.jpg", 3);
-  std::vector<uint32_t> groupsC = Groups(c);
+  SData target = Data(c);
+  data.properties = target.properties;
+  data.groups = target.groups;
   ASSERT_EQ(engine_.MoveFile(a, pics_, "c.jpg", true), VX_OK);
   EXPECT_TRUE(Gone(c));
-  EXPECT_EQ(Properties(a), MakeRow(3, 2));
-  EXPECT_EQ(Groups(a), groupsC);
-  EXPECT_EQ(ShapeBytes(a), shapeA);
+  EXPECT_EQ(Data(a), data);
 
   // Within its own folder under its own name nothing is lost.
   ASSERT_EQ(engine_.MoveFile(a, pics_, "", true), VX_OK);
-  EXPECT_EQ(ShapeBytes(a), shapeA);
-  EXPECT_TRUE(HasThumb(a));
-  EXPECT_EQ(Properties(a), MakeRow(3, 2));
+  EXPECT_EQ(Data(a), data);
   EXPECT_EQ(engine_.MoveFile(999, pics_, "", false), VX_NOT_FOUND);
 }
 
 TEST_F(EngineFilesTest, CopyFileCopiesEveryStoreOrTakesOverTheTarget) {
   uint32_t a = AddFullFile(pics_, "a.jpg", 1);
+  SData data = Data(a);
   unsigned long copy = 0;
   ASSERT_EQ(engine_.CopyFile(a, other_, copy, "copy.jpg", false), VX_OK);
   ASSERT_NE(copy, 0u);
-  uint32_t c = static_cast<uint32_t>(copy);
-  EXPECT_EQ(File(c).Name(), "copy.jpg");
-  EXPECT_EQ(ShapeBytes(c), ShapeBytes(a));
-  CVXThumb ta, tc;
-  ASSERT_EQ(engine_.GetThumb(a, ta), VX_OK);
-  ASSERT_EQ(engine_.GetThumb(c, tc), VX_OK);
-  EXPECT_EQ(tc.DataSize(), ta.DataSize());
-  EXPECT_EQ(std::memcmp(tc.Data(), ta.Data(), ta.DataSize()), 0);
-  EXPECT_EQ(Properties(c), MakeRow(1, 2));
-  EXPECT_EQ(XMPPacket(c), "a.jpg");
-  EXPECT_EQ(Groups(c), Groups(a));
-  EXPECT_FALSE(Gone(a));
+  EXPECT_EQ(File(copy).Name(), "copy.jpg");
+  EXPECT_EQ(Data(copy), data);
+  EXPECT_EQ(Data(a), data);
 
   // Onto an existing name, taking over: the copy gets the target's properties and categories,
-  // the source's shape and thumbnail, and the target leaves every store.
+  // the source's shape, thumbnail and XMP, and the target leaves every store.
   uint32_t t = AddFullFile(other_, "t.jpg", 5);
-  std::vector<uint32_t> groupsT = Groups(t);
-  unsigned long over = 0;
-  ASSERT_EQ(engine_.CopyFile(a, other_, over, "T.jpg", true), VX_OK);
-  uint32_t o = static_cast<uint32_t>(over);
+  SData target = Data(t);
+  ASSERT_EQ(engine_.CopyFile(a, other_, copy, "T.jpg", true), VX_OK);
   EXPECT_TRUE(Gone(t));
-  EXPECT_EQ(Properties(o), MakeRow(5, 2));
-  EXPECT_EQ(Groups(o), groupsT);
-  EXPECT_EQ(ShapeBytes(o), ShapeBytes(a));
-  EXPECT_EQ(XMPPacket(o), "a.jpg");
+  SData over = Data(copy);
+  EXPECT_EQ(over.properties, target.properties);
+  EXPECT_EQ(over.groups, target.groups);
+  over.properties = data.properties;
+  over.groups = data.groups;
+  EXPECT_EQ(over, data);
 
   // Onto itself: the copy replaces the source, and the source's data goes with it.
-  unsigned long self = 0;
-  ASSERT_EQ(engine_.CopyFile(a, pics_, self, "", false), VX_OK);
+  ASSERT_EQ(engine_.CopyFile(a, pics_, copy, "", false), VX_OK);
   EXPECT_TRUE(Gone(a));
-  EXPECT_EQ(Properties(static_cast<uint32_t>(self)), MakeRow(1, 2));
-  EXPECT_TRUE(HasThumb(static_cast<uint32_t>(self)));
-}
-
-TEST_F(EngineFilesTest, FailedCopyLeavesNoHalfCopy) {
-  uint32_t a = AddFullFile(pics_, "a.jpg", 1);
-  unsigned long copy = 77;
-  EXPECT_EQ(engine_.CopyFile(a, 999, copy, "x.jpg", false), VX_NOT_FOUND);
-  EXPECT_EQ(copy, 0u);
-  EXPECT_EQ(engine_.CopyFile(999, other_, copy, "x.jpg", false), VX_NOT_FOUND);
-
-  // The property store refuses to write: the copy fails after its shape data and thumbnail
-  // went in, and they go again with the catalog record.
-  uint32_t next = engine_.Catalog().Header().LastFileOid + 1;
-  sqlite3* props = engine_.GetPropertyDatabase().BlobDB().Handle();
-  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=1", nullptr, nullptr, nullptr), SQLITE_OK);
-  EXPECT_NE(engine_.CopyFile(a, other_, copy, "x.jpg", false), VX_OK);
-  ASSERT_EQ(sqlite3_exec(props, "PRAGMA query_only=0", nullptr, nullptr, nullptr), SQLITE_OK);
-  EXPECT_EQ(copy, 0u);
-  EXPECT_TRUE(Gone(next));
-  EXPECT_EQ(engine_.Catalog().NumberOfFiles(), 1u);
-  EXPECT_FALSE(Gone(a));
+  EXPECT_EQ(Data(copy), data);
 }
 
 // A copy cut short by a crash leaves data under the OID the catalog hands out next. Neither a
@@ -371,7 +333,7 @@ TEST_F(EngineFilesTest, LeftoversOfAnUnfinishedCopyAreNotAdopted) {
   CVXCatFile file(0, "new.jpg", pics_);
   ASSERT_EQ(engine_.AddFile(file, MakeBitmap(8, 8, 2), 2), VX_OK);
   ASSERT_EQ(file.Oid(), next);
-  EXPECT_TRUE(Properties(next).empty());
+  EXPECT_TRUE(Data(next).properties.empty());
   EXPECT_EQ(XMPPacket(next), "");
   EXPECT_EQ(engine_.AddImageProperties(next, MakeRow(7, 2)), VX_OK);
 
@@ -380,9 +342,7 @@ TEST_F(EngineFilesTest, LeftoversOfAnUnfinishedCopyAreNotAdopted) {
   unsigned long copy = 0;
   ASSERT_EQ(engine_.CopyFile(a, other_, copy, "", false), VX_OK);
   ASSERT_EQ(copy, next);
-  EXPECT_EQ(Properties(next), MakeRow(1, 2));
-  EXPECT_EQ(XMPPacket(next), "a.jpg");
-  EXPECT_EQ(ShapeBytes(next), ShapeBytes(a));
+  EXPECT_EQ(Data(next), Data(a));
 }
 
 TEST_F(EngineFilesTest, SetFileUpdatesTheRecordAndWithABitmapTheShape) {
@@ -394,9 +354,18 @@ TEST_F(EngineFilesTest, SetFileUpdatesTheRecordAndWithABitmapTheShape) {
   EXPECT_EQ(File(oid).Properties().Size, 1234u);
   EXPECT_EQ(ShapeBytes(oid), shape);
 
-  CVXBitmap bitmap = MakeBitmap(16, 16, 9);
+  // An empty bitmap keeps the shape data and the record as they were.
+  file.Properties().Size = 99;
+  CVXBitmap bitmap;
+  log_.ClearCaptured();
+  EXPECT_EQ(engine_.SetFile(file, &bitmap, 5), VX_NOT_FOUND);
+  EXPECT_TRUE(log_.Has("Processing file in SetFile"));
+  EXPECT_EQ(ShapeBytes(oid), shape);
+  EXPECT_EQ(File(oid).Properties().Size, 1234u);
+
+  bitmap = MakeBitmap(16, 16, 9);
   ASSERT_EQ(engine_.SetFile(file, &bitmap, 55), VX_OK);
-  EXPECT_NE(ShapeBytes(oid), shape);
+  EXPECT_EQ(ShapeBytes(oid), ShapeOf(bitmap));
   EXPECT_EQ(File(oid).Properties().CRC, 55u);
   ASSERT_EQ(engine_.SetFile(file, nullptr, 66), VX_OK);
   EXPECT_EQ(File(oid).Properties().CRC, 55u) << "without a bitmap the record goes as given";
@@ -406,29 +375,26 @@ TEST_F(EngineFilesTest, SetFileUpdatesTheRecordAndWithABitmapTheShape) {
   EXPECT_TRUE(ShapeBytes(4242).empty());
 }
 
-TEST_F(EngineFilesTest, AddFolderMatchesMediumKindAndLocation) {
+TEST_F(EngineFilesTest, FoldersMatchByMediumAndRenameWithoutMovingData) {
   log_.ClearCaptured();
   uint32_t again = AddFolder("C:/PICS/", "vol", "");
   EXPECT_EQ(again, pics_) << "an empty serial matches any";
   EXPECT_TRUE(log_.Has("Folder already in database. OID is " + std::to_string(pics_)));
   EXPECT_TRUE(log_.Has("  file://C:/PICS/ Media-ID: vol, Serial "));
-  uint32_t otherMedium = AddFolder("c:/pics/", "VOL2", "1");
-  EXPECT_NE(otherMedium, pics_);
-  uint32_t otherSerial = AddFolder("c:/pics/", "VOL", "2");
-  EXPECT_NE(otherSerial, pics_);
+  EXPECT_NE(AddFolder("c:/pics/", "VOL2", "1"), pics_);
+  EXPECT_NE(AddFolder("c:/pics/", "VOL", "2"), pics_);
   EXPECT_TRUE(log_.Has("New Folder"));
-}
 
-TEST_F(EngineFilesTest, FolderRenamesMoveNoDataAndMissesAreLogged) {
-  uint32_t sub = AddFolder("c:/pics/sub/");
+  // Renaming a folder moves no data.
+  uint32_t sub = AddFolder("c:/other/sub/");
   uint32_t b = AddFile(sub, "b.jpg");
-  ASSERT_EQ(engine_.RenameFolder(pics_, CVXURI("c:/moved/", true), "VOL", "1"), VX_OK);
+  ASSERT_EQ(engine_.RenameFolder(other_, CVXURI("c:/moved/", true), "VOL", "1"), VX_OK);
   CVXURI uri;
   ASSERT_EQ(engine_.Catalog().GetFileURI(b, uri), VX_OK);
   EXPECT_EQ(uri.AsString(), "file://c:/moved/sub/b.jpg");
   EXPECT_EQ(ShapeBytes(b).size(), 1601u);
   std::vector<uint32_t> list;
-  ASSERT_EQ(engine_.GetFolderFiles(pics_, list, true), VX_OK);
+  ASSERT_EQ(engine_.GetFolderFiles(other_, list, true), VX_OK);
   EXPECT_EQ(list, std::vector<uint32_t>{b});
 
   log_.ClearCaptured();

@@ -163,10 +163,9 @@ TEST_F(EngineQueries, SortArrays) {
 TEST_F(EngineQueries, StatsCountAndMeasureTheStores) {
   uint32_t d = AddFolder("/pics/");
   for (uint32_t size : {0xF0000000u, 0x20000000u}) {
-    CVXCatFile file;
-    ASSERT_EQ(Cat().LookupFile(AddFile(d, std::to_string(size)), file), VX_OK);
+    CVXCatFile file(Cat().GenerateFileOID(), std::to_string(size), d);
     file.Properties().Size = size;
-    ASSERT_EQ(Cat().UpdateFile(file), VX_OK);
+    ASSERT_EQ(Cat().AddFile(d, file), VX_OK);
   }
   AddGroup("G");
   unsigned long oid = 1;
