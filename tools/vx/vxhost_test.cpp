@@ -5,7 +5,6 @@
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
-#include <vips/vips.h>
 #include <zlib.h>
 
 #include <vxcore3/vxcore3.h>
@@ -89,7 +88,6 @@ TEST_F(HostFiles, DecodesShrunkSRGBAWithHeaderFacts) {
   DecodedImage jpeg = MustDecode(P("photo.jpg"), {.maxSide = 100});
   EXPECT_EQ(Shape(jpeg), std::tuple(100u, 75u, 640u, 480u, kFormatJpeg));
   EXPECT_EQ(std::tuple(jpeg.info.loader, jpeg.grayScale), std::tuple("jpegload", false));
-  ASSERT_EQ(jpeg.pixels.size(), 100u * 75 * 4);
   Px last = PixelAt(jpeg, 100 * 75 - 1);  // bottom right: red and green high
   EXPECT_TRUE(last[0] > 230 && last[1] > 230 && std::abs(last[2] - 128) <= 8 && last[3] == 255)
       << testing::PrintToString(last);
@@ -156,13 +154,9 @@ TEST_F(HostFiles, JpegThumbnailFitsTheBoxAndBitmapCopies) {
   EncodedJpeg thumb;
   ASSERT_TRUE(
       EncodeJpegThumbnail(in.pixels.data(), in.width, in.height, 160, 160, 85, &thumb).ok());
-  ASSERT_GT(thumb.bytes.size(), 100u);
-  EXPECT_EQ(std::tuple(thumb.width, thumb.height, thumb.bytes[0], thumb.bytes[1]),
-            std::tuple(160u, 120u, 0xFF, 0xD8));
-  VipsImage* back = vips_image_new_from_buffer(thumb.bytes.data(), thumb.bytes.size(), "", nullptr);
-  ASSERT_NE(back, nullptr);
-  EXPECT_EQ(std::tuple(vips_image_get_width(back), vips_image_get_bands(back)), std::tuple(160, 3));
-  g_object_unref(back);
+  EXPECT_EQ(std::tuple(thumb.width, thumb.height), std::tuple(160u, 120u));
+  vxtest::WriteFile(P("thumb.jpg"), std::string(thumb.bytes.begin(), thumb.bytes.end()));
+  EXPECT_EQ(Shape(MustDecode(P("thumb.jpg"))), std::tuple(160u, 120u, 160u, 120u, kFormatJpeg));
 
   const std::vector<uint8_t> clear(8 * 8 * 4, 0);  // transparent black turns white
   ASSERT_TRUE(EncodeJpegThumbnail(clear.data(), 8, 8, 16, 16, 90, &thumb).ok());
@@ -217,9 +211,7 @@ TEST_F(HostFiles, MetadataRoundTrip) {
   EXPECT_TRUE(m.hasDateTaken && m.hasGps);
   EXPECT_EQ(m.dateTaken, int64_t(std::mktime(&tm)));  // in local time
   EXPECT_EQ(std::tuple(m.iso, m.orientation, m.width, m.rating), std::tuple(400u, 6, 640u, 4));
-  EXPECT_DOUBLE_EQ(m.exposureTime, 0.004);
-  EXPECT_DOUBLE_EQ(m.fNumber, 2.8);
-  EXPECT_DOUBLE_EQ(m.focalLength, 50);
+  EXPECT_EQ(std::tuple(m.exposureTime, m.fNumber, m.focalLength), std::tuple(0.004, 2.8, 50.0));
   EXPECT_NEAR(m.latitude, -(48 + 51 / 60.0 + 30 / 3600.0), 1e-9);
   EXPECT_NEAR(m.longitude, 2 + 17 / 60.0 + 40 / 3600.0, 1e-9);
   EXPECT_EQ(m.keywords, (std::vector<std::string>{"Paris", "tower", "night"}));
@@ -312,7 +304,6 @@ TEST(HostVolumeTable, MountsLabelsAndSerial) {
                        "other /media/usb2 tmpfs rw 0 0\n";
   VolumeTable table(mounts, dir / "by-label");
   ASSERT_EQ(table.mounts().size(), 4u);
-  EXPECT_EQ(table.mounts()[1].mountPoint, "/media/usb stick");
   EXPECT_EQ(table.FindMount("/media/usb stick/a")->mountPoint, "/media/usb stick");
   EXPECT_EQ(table.FindMount("/media/usb sticky")->mountPoint, "/");
   EXPECT_EQ(table.FindMount("/media/usb2")->device, "other");  // the later mount hides
