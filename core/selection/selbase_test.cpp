@@ -3,7 +3,6 @@
 #include <cmath>
 #include <map>
 #include <string>
-#include <type_traits>
 #include <vector>
 
 #include "Hist.h"
@@ -38,11 +37,10 @@ SSelProps Prop(const std::string& column, uint32_t type) {
 
 template <typename T>
 void Put(CVXSelector& selector, const T& record) {
-  if constexpr (std::is_same_v<T, SSelProps>) {
-    selector.SetFeature(SSelProps::GenerateID(record.Table, record.Column), seltest::Blob(record));
-  } else {
-    selector.SetFeature(T::kKey, seltest::Blob(record));
-  }
+  selector.SetFeature(T::kKey, seltest::Blob(record));
+}
+void Put(CVXSelector& selector, const SSelProps& record) {
+  selector.SetFeature(SSelProps::GenerateID(record.Table, record.Column), seltest::Blob(record));
 }
 
 // Limits that keep every hit, so the checks' own scores show; a later SSelLimits replaces them.
@@ -130,38 +128,44 @@ class SelBaseTest : public vxtest::EngineFixture {
   return ::testing::AssertionFailure() << "hits:" << text;
 }
 
-// ---- Scores, averaging and the gate
+// ---- Scores, averaging and the gate, on file sizes
 
-TEST_F(SelBaseTest, ScoresAverageOverFeaturesAndTheGateRejectsEarly) {
+TEST_F(SelBaseTest, FileSizeScoresAverageOverFeaturesAndTheGateRejectsEarly) {
   Add({.name = "o", .size = 100000});
-  Add({.name = "near", .size = 110000});  // 10 % off: 90
-  Add({.name = "far", .size = 130000});   // 30 % off: 70, below the gate
-  Add({.name = "huge", .size = 300000});  // beyond the tolerance
+  Add({.name = "smaller", .size = 95000});  // 5 % off: 95
+  Add({.name = "lo", .size = 102400});      // 100 KB; 2.4 % off: 98
+  Add({.name = "near", .size = 110000});    // 10 % off: 90
+  Add({.name = "far", .size = 130000});     // 30 % off: 70, below the gate
+  Add({.name = "hi", .size = 204800});      // 200 KB; beyond the tolerance
+  Add({.name = "over", .size = 204801});
   auto size = Feature<SSelFileSize>();
   size.TolerancePercent = 50;
-  EXPECT_TRUE(Same(Run(Make(size), {"o"}), {{"near", 90}, {"far", 70}}));
-
+  EXPECT_TRUE(
+      Same(Run(Make(size), {"o"}), {{"smaller", 95}, {"lo", 98}, {"near", 90}, {"far", 70}}));
   auto limits = Feature<SSelLimits>();  // Mode 1, MinScore 75
   limits.Mode = 0;
-  EXPECT_TRUE(Same(Run(Make(limits, size), {"o"}), {{"near", 95}, {"far", 85}}));
-  EXPECT_TRUE(Same(Run(Make(limits), {"o"}), {{"near", 100}, {"far", 100}, {"huge", 100}}));
+  EXPECT_TRUE(Same(Run(Make(limits, size), {"o"}),
+                   {{"smaller", 97.5}, {"lo", 99}, {"near", 95}, {"far", 85}}));
 
   // With the gate, a candidate below MinScore never reaches the later checks: the property
-  // check, last in line, reads a row only for the two that pass.
+  // check, last in line, reads a row only for the three that pass.
   limits.Mode = 1;
-  auto props = Prop("n", vptUInt32);
+  vxtest::DefineColumns(engine_, 1);
+  auto props = Prop("p0", vptUInt32);
   props.MatchEmpty = true, props.Conditions[0].High = CVXProperty(100u);
-  CVXTable table(VX_IMAGE_PROPERTIES_TABLE);
-  table.Properties().Name = "Image Properties";
-  table.AddColumn("n", vptUInt32);
-  ASSERT_EQ(engine_.GetPropertyDatabase().SetTable(table), VX_OK);
   auto rowReads = [&] {
     return log_.Count("+ VXEngine::GetImageProperties") -
            log_.Count("+ VXEngine::GetImagePropertiesTable");
   };
   const size_t before = rowReads();
-  EXPECT_TRUE(Same(Run(Make(limits, size, props), {"o"}), {{"near", 290 / 3.}}));
-  EXPECT_EQ(rowReads() - before, 1u);
+  EXPECT_TRUE(Same(Run(Make(limits, size, props), {"o"}),
+                   {{"smaller", 295 / 3.}, {"lo", 298 / 3.}, {"near", 290 / 3.}}));
+  EXPECT_EQ(rowReads() - before, 3u);
+
+  size.Mode = 1, size.MinKB = 100, size.MaxKB = 200;  // bounds inclusive
+  EXPECT_EQ(Found(Make(size)), (Names{"far", "hi", "lo", "near"}));
+  size.Mode = 2;
+  EXPECT_TRUE(Run(Make(size)).empty());
 }
 
 // ---- Preselection
@@ -273,21 +277,7 @@ TEST_F(SelBaseTest, DimensionsRelativeAbsoluteAndByOrientation) {
   EXPECT_EQ(Found(Make(dim), {"o"}), (Names{"near", "square", "wide"}));
 }
 
-// ---- Size, date and name
-
-TEST_F(SelBaseTest, FileSizeRelativeScoresAndAbsoluteBoundsInclusive) {
-  Add({.name = "o", .size = 100000});
-  Add({.name = "smaller", .size = 95000});
-  Add({.name = "lo", .size = 102400});
-  Add({.name = "hi", .size = 204800});
-  Add({.name = "over", .size = 204801});
-  auto size = Feature<SSelFileSize>();
-  EXPECT_TRUE(Same(Run(Make(size), {"o"}), {{"smaller", 95}, {"lo", 98}}));
-  size.Mode = 1, size.MinKB = 100, size.MaxKB = 200;
-  EXPECT_EQ(Found(Make(size)), (Names{"hi", "lo"}));
-  size.Mode = 2;
-  EXPECT_TRUE(Run(Make(size)).empty());
-}
+// ---- Date and name
 
 TEST_F(SelBaseTest, DateTimeRangesRelationsAndDistances) {
   const int32_t t0 = 1000000000, day = 86400;
@@ -383,12 +373,6 @@ TEST_F(SelBaseTest, MatchDispatchesByMethodAndBlendsTheHistogram) {
   const SVXDBRec_3 o = vxtest::MakeShape(1), c = vxtest::MakeShape(77);
   Add({.name = "o", .shape = o});
   Add({.name = "c", .shape = c});
-  auto quick = [&](uint32_t weighting, const SVXWeightMatrix& w) {
-    SVXMatchParams p;
-    p.SetWeights(30, 25);
-    p.Weighting = weighting, p.Weights = &w;
-    return MatchCSQuick(o, c, p);
-  };
   auto hist = [&](uint32_t weighting) {
     CHist ho, hc;
     ho.Build(o.Info, weighting);
@@ -399,9 +383,8 @@ TEST_F(SelBaseTest, MatchDispatchesByMethodAndBlendsTheHistogram) {
   };
   SVXMatchParams plain;
   plain.SetWeights(30, 25);
-  const SVXWeightMatrix ones;
   auto match = Feature<SSelMatch>();  // method 2, quick, ColorWeight 25
-  EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], quick(0, ones));
+  EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], MatchCSQuick(o, c, plain));
   match.Precision = 1;
   EXPECT_DOUBLE_EQ(Run(Make(match), {"o"})["c"], MatchCSFuzzy(o, c, plain));
   match.Method = 0;
@@ -417,11 +400,11 @@ TEST_F(SelBaseTest, MatchDispatchesByMethodAndBlendsTheHistogram) {
   for (int i = 0; i < 400; ++i) mask.Cells[i] = static_cast<uint8_t>(i % 3);
   SVXWeightMatrix masked;
   masked.SetMask(mask.Cells);
-  EXPECT_DOUBLE_EQ(Run(Make(match, mask), {"o"})["c"], quick(3, masked));
-  match.Weighting = 1, match.ColorWeight = 30;
   SVXMatchParams p = plain;
-  p.SetWeights(30, 30);
   p.Weighting = 3, p.Weights = &masked;
+  EXPECT_DOUBLE_EQ(Run(Make(match, mask), {"o"})["c"], MatchCSQuick(o, c, p));
+  match.Weighting = 1, match.ColorWeight = 30;
+  p.SetWeights(30, 30);
   EXPECT_DOUBLE_EQ(Run(Make(match, mask), {"o"})["c"], (hist(1) + MatchCSQuick(o, c, p)) * 0.5);
 }
 
