@@ -142,8 +142,9 @@ TEST(BitVector, WalksCountsAndIteratorsAgreeWithAModel) {
 }
 
 TEST(BitVector, BufferIsLittleEndianBytesRoundedTo32Bits) {
-  for (uint32_t bits : {0, 1, 32, 33, 64, 65})
+  for (uint32_t bits : {0, 1, 32, 33, 64, 65}) {
     EXPECT_EQ(Of({}, bits).BufferSize(), (bits + 31) / 32 * 4) << bits;
+  }
   const std::vector<uint8_t> bytes = {0x01, 0x02, 0x00, 0x80, 0x02, 0x00, 0x00, 0x00};
   CBitVector v = Of({0, 9, 31, 33}, 40);
   ASSERT_EQ(v.BufferSize(), bytes.size());

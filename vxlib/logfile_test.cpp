@@ -108,11 +108,13 @@ TEST(Logfile, ConcurrentCallersWriteWholeLines) {
   log.SetCapture(true);
   constexpr int kThreads = 8, kLines = 500;
   std::vector<std::thread> threads;
+  threads.reserve(kThreads);
   for (int t = 0; t < kThreads; ++t) {
     threads.emplace_back([&log, t] {
       std::string payload(100 + t, static_cast<char>('a' + t));
-      for (int i = 0; i < kLines; ++i)
+      for (int i = 0; i < kLines; ++i) {
         log.AddFormat("t%d n%d %s", 3, 0, nullptr, t, i, payload.c_str());
+      }
     });
   }
   for (auto& th : threads) th.join();

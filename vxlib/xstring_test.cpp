@@ -21,8 +21,9 @@ TEST(XString, StringToLong) {
       {"42", 42}, {" \t-17abc", -17}, {"+8", 8}, {"12 34", 12}, {"", 0}, {"-", 0}, {"- 5", 0},
   };
   for (auto [text, value] : cases) EXPECT_EQ(StringToLong(text), value) << text;
-  for (const char* high : {"2147483647", "2147483648", "99999999999999999999999999"})
+  for (const char* high : {"2147483647", "2147483648", "99999999999999999999999999"}) {
     EXPECT_EQ(StringToLong(high), INT32_MAX) << high;
+  }
   for (const char* low : {"-2147483648", "-2147483649"}) EXPECT_EQ(StringToLong(low), INT32_MIN);
   EXPECT_EQ(StringToLong("0000000000000000000000000012"), 12);
 }
@@ -72,8 +73,9 @@ TEST(XString, CaseInsensitiveComparisonFoldsUnicodeAndOrdersByFoldedCodePoint) {
   // Antisymmetric over a mixed set, stray bytes included.
   const char* samples[] = {"", "a", "A", "ab", "é", "É", "\xFF", "\xC3", "a\xFF", "z", "Ω", "_"};
   for (const char* a : samples) {
-    for (const char* b : samples)
+    for (const char* b : samples) {
       EXPECT_EQ(Sign(_mbsicmp(a, b)), -Sign(_mbsicmp(b, a))) << a << " / " << b;
+    }
   }
 }
 

@@ -69,7 +69,7 @@ unsigned CVXCatalog::GetFullGroupName(uint32_t oid, std::string& name) const {
   for (size_t steps = 0; parent != 0; ++steps) {
     const CVXGroup* p = GetGroup(parent);
     if (!p || steps > groups_.size()) return VX_NOT_FOUND;
-    name = p->Name() + "." + name;
+    name.insert(0, p->Name() + ".");
     parent = p->Parent();
   }
   return VX_OK;
@@ -291,6 +291,7 @@ unsigned CVXCatalog::ReorderGroup(uint32_t oid, uint32_t targetOid, bool before)
     }
     std::stable_sort(items.begin(), items.end(), SortItemLess);
     std::vector<uint32_t> out;
+    out.reserve(items.size());
     for (const SSortItem& item : items) out.push_back(item.Oid);
     return out;
   };

@@ -113,7 +113,7 @@ void CVXGroup::Read(CVXFile& file) {
   if (version >= 6) file >> g.ftiType_ >> g.ftiSubStrStart_ >> g.ftiSubStrLen_;
   if (version >= 7) file >> g.lastActiveOid_;
   g.inError_ = inError_;
-  *this = std::move(g);
+  *this = g;
 }
 
 CVXFile& operator<<(CVXFile& file, const CVXGroup& group) {
@@ -213,8 +213,9 @@ int32_t PositionOf(const SToken& token) { return static_cast<int32_t>(token.posi
 uint32_t FindFolder(const CVXCatalog& catalog, const CVXURI& uri, const SExpr& e) {
   for (const auto& [oid, folder] : catalog.Folders()) {
     if (xstring_comparenocase(e.MediaID, folder.MediaID()) != 0) continue;
-    if (!e.MediaSerial.empty() && xstring_comparenocase(e.MediaSerial, folder.MediaSerial()) != 0)
+    if (!e.MediaSerial.empty() && xstring_comparenocase(e.MediaSerial, folder.MediaSerial()) != 0) {
       continue;
+    }
     if (folder.URI() == uri) return oid;
   }
   return 0;

@@ -414,8 +414,9 @@ unsigned CVXEngine::Close() {
       VX_ERROR(log_, VX_NOT_FOUND, "Closing Sort Database");
     }
     VX_LOG(log_, 3, "    Sort Database closed");
-    if (templates_.Close() != VX_OK)
+    if (templates_.Close() != VX_OK) {
       VX_ERROR(log_, VX_NOT_FOUND, "Closing Selection Template Store");
+    }
     VX_LOG(log_, 3, "    Selection Template Store closed");
     if ((rc = FreePlugIns()) != VX_OK) VX_ERROR(log_, rc, "Unloading plug-in modules");
     VX_LOG(log_, 3, "    Plug-in modules unloaded");

@@ -95,8 +95,9 @@ unsigned CVXEngine::ProcessFile(CVXCatFile& file, const CVXBitmap& bitmap, bool 
     if (!shaper_) shaper_ = std::make_unique<CShape>();
     SVXDBRec_3 record{};  // the flag byte stays 0
     // No pixels, no shape: storing the cleared record would make every such file match.
-    if (!shaper_->CalcShapeInfo(bitmap, record.Info, kShapeThreshold))
+    if (!shaper_->CalcShapeInfo(bitmap, record.Info, kShapeThreshold)) {
       return unsigned{VX_NOT_FOUND};
+    }
     VX_LOG(log_, 3, update ? "Update" : "Insert");
     return matchDB_.Set(Sel(kShapeRecord, file.Oid()), &record, sizeof record);
   });

@@ -240,6 +240,7 @@ TEST_F(EngineTest, DamagedStoreFilesGiveCodesNotCrashes) {
 // Public operations from many threads meet the engine's lock; run under ThreadSanitizer in CI.
 TEST_F(EngineTest, ConcurrentCallersAreSerialised) {
   std::vector<std::thread> threads;
+  threads.reserve(4);
   for (int t = 0; t < 4; ++t) {
     threads.emplace_back([this, t] {
       uint8_t data[VX_APP_DATA_SIZE];

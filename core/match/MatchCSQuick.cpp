@@ -70,8 +70,9 @@ double WeightedRotated(const uint8_t* o, const uint8_t* c, const SVXMatchParams&
   ForVisited<kStep>([&](int i, int k) {
     const int j = i + 20 * k;
     if (!(w[j] > 1e-06)) return;
-    for (int r = 0; r < 4; ++r)
+    for (int r = 0; r < 4; ++r) {
       totals[r] += Distance(o + 4 * Oriented(r, i, k), c + 4 * j, p) * w[j];
+    }
   });
   const double total = std::min(std::min(totals[0], totals[1]), std::min(totals[2], totals[3]));
   return Score(WeightedNorm<kStep>(p), total);

@@ -174,8 +174,9 @@ template <bool kFast>
 VX_AVX2 double WeightedNorm(const SVXMatchParams& p) {
   __m256d sum = _mm256_setzero_pd();
   for (int k = 0; k < 20; k += kFast ? 2 : 1) {
-    for (int g = 0; g < 5; ++g)
+    for (int g = 0; g < 5; ++g) {
       sum = _mm256_add_pd(sum, VisitedWeights<kFast>(p.Weights->W + 20 * k + 4 * g));
+    }
   }
   return HorizontalSum(sum) * p.MaxDistance();
 }

@@ -63,6 +63,7 @@ struct Ref {
   const SVXMatchParams& p;
   double a = p.LumaScale, b = p.ColorScale, dmax = (255 * a + 510) * b + 255;
   int s = p.Fast ? 2 : 1;
+  int side = 20 / s;  // visited cells per row and column
   bool weighted = p.Weighting != 0;
 
   double Dist(const Rec& o, int oc, const Rec& c, int cc) const {
@@ -73,7 +74,7 @@ struct Ref {
 
   double Quick(const Rec& o, const Rec& c) const {
     const double* W = p.Weights->W;
-    double n = (20 / s) * (20 / s) * dmax;
+    double n = side * side * dmax;
     if (weighted) {
       n = 0;
       for (int i = 0; i < 20; i += s) {
@@ -99,7 +100,7 @@ struct Ref {
   }
 
   double Fuzzy(const Rec& o, const Rec& c) const {
-    const double L = dmax * 0.06666666666666667, n = (20 / s) * (20 / s) * dmax;
+    const double L = dmax * 0.06666666666666667, n = side * side * dmax;
     double t = 0;
     for (int i = 0; i < 20; i += s) {
       for (int k = 0; k < 20; k += s) {

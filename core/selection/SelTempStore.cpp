@@ -90,10 +90,11 @@ unsigned SelTempStore::Flush() {
   } catch (...) {
     rc = VXCodeOfCurrentException(Log_(), __LINE__, __FILE__);
   }
-  if (rc != VX_OK)
+  if (rc != VX_OK) {
     VX_ERROR(Log_(), rc, "Flushing selection templates");
-  else
+  } else {
     VX_LOG(Log_(), 2, "- Completed");
+  }
   return rc;
 }
 

@@ -52,6 +52,6 @@ CVXFile& operator>>(CVXFile& file, CVXPersistantSelection& selection) {
   file >> objectVersion >> r.Oid() >> version >> d.Name >> d.TimeStamp >> d.Reserved >>
       d.Selector >> d.Result >> dirty;
   r.SetDirty(dirty != 0);
-  selection = std::move(r);
+  selection = r;
   return file;
 }

@@ -142,6 +142,7 @@ void CVXSelBase::LoadPropSelectors_(const CVXSelector& selector) {
 bool CVXSelBase::InitPlugIns(const CVXSelector& selector,
                              const std::vector<SVXFileDescriptor>& originals) {
   std::vector<uint32_t> oids;
+  oids.reserve(originals.size());
   for (const SVXFileDescriptor& d : originals) oids.push_back(d.OID);
   for (CPlugInLink* plugIn : MatchPlugIns_()) {
     const std::string id = plugIn->GetUnqiueID();
@@ -550,8 +551,9 @@ void CVXSelBase::ScoreShapes(const SPreparedShape& original, const SPreparedShap
       MatchCSQuickPreparedMany(original.Quick, quick, m, params, scores + at);
     }
   } else {
-    for (size_t j = 0; j < count; ++j)
+    for (size_t j = 0; j < count; ++j) {
       scores[j] = MatchWithoutHistogram_(*original.Record, *candidates[j].Record);
+    }
   }
   for (size_t j = 0; j < count; ++j) {
     const double match = scores[j];
@@ -677,6 +679,8 @@ bool CVXSelBase::CheckPropRec(double& score) {
   for (const SSelProps& selector : PropSelectors) {
     const auto column = PropColumns.find(selector.Column);
     const CVXProperty* value = nullptr;
+    // A column the table lacks fails the selector as a failed condition does.
+    // NOLINTNEXTLINE(bugprone-branch-clone)
     if (column == PropColumns.end()) {
       ok = false;
     } else if (!PropTable.GetColumnData(column->second, PropRow, value)) {

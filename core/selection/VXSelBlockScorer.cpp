@@ -7,8 +7,9 @@ CVXSelBlockScorer::CVXSelBlockScorer(const CVXSelBase& worker,
   for (size_t i = 0; i < originals.size(); ++i) worker_.PrepareShape(*originals[i], originals_[i]);
   // A part of no originals would only cost a wake-up.
   if (parts_ > originals_.size()) parts_ = originals_.empty() ? 1 : unsigned(originals_.size());
-  for (unsigned part = 1; part < parts_; ++part)
+  for (unsigned part = 1; part < parts_; ++part) {
     helpers_.emplace_back(&CVXSelBlockScorer::Helper_, this, part);
+  }
 }
 
 CVXSelBlockScorer::~CVXSelBlockScorer() {
@@ -23,8 +24,9 @@ CVXSelBlockScorer::~CVXSelBlockScorer() {
 void CVXSelBlockScorer::ScoreBlock(const std::vector<const SVXDBRec_3*>& candidates,
                                    const std::vector<double>& floors) {
   candidates_.resize(candidates.size());
-  for (size_t b = 0; b < candidates.size(); ++b)
+  for (size_t b = 0; b < candidates.size(); ++b) {
     worker_.PrepareShape(*candidates[b], candidates_[b]);
+  }
   floors_ = floors.empty() ? nullptr : &floors;
   passes_.resize(parts_);
   for (auto& part : passes_) {
@@ -69,8 +71,9 @@ void CVXSelBlockScorer::ScorePart_(unsigned part) {
     const double floor = floors_ ? (*floors_)[i] : 0.0;
     for (size_t b = 0; b < m; ++b) {
       // The caller's test in the same form, so that a score that is not a number fails here too.
-      if (passed[b] && scores[b] >= floor)
+      if (passed[b] && scores[b] >= floor) {
         passes[b].push_back({static_cast<uint32_t>(i), scores[b]});
+      }
     }
   }
 }

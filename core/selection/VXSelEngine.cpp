@@ -386,8 +386,9 @@ void CVXSelEngine::ScoreWithoutOriginals_(CVXResultSet& result) {
   double sum = 0;
   if (!SumWorkers_(0, sum)) return;
   const double w = static_cast<double>(workers_.size());
-  if (sum / w <= sum)
+  if (sum / w <= sum) {
     entry.Hits.push_back({currentOid_, currentFile_.Properties().Folder, sum / w});
+  }
   // The cut-off this gives is not kept: without originals the workers never see one.
   if (interval_ != 0 && entry.Hits.size() > limits_.MaxResults + interval_) {
     cutOffInForce_ = true;

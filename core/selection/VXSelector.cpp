@@ -149,6 +149,6 @@ CVXFile& operator>>(CVXFile& file, CVXSelector& selector) {
   }
   d.NeedsOriginals =
       needsOriginals != 0 || r.AnyCore_("", [](const SSelCoreData& c) { return c.NeedsOriginals; });
-  selector = std::move(r);
+  selector = r;
   return file;
 }

@@ -105,9 +105,9 @@ class SelBaseTest : public vxtest::EngineFixture {
   }
 
   // The names of the hits only.
-  Names Found(CVXSelector selector, const Names& originals = {}) {
+  Names Found(const CVXSelector& selector, const Names& originals = {}) {
     Names names;
-    for (const auto& hit : Run(std::move(selector), originals)) names.push_back(hit.first);
+    for (const auto& hit : Run(selector, originals)) names.push_back(hit.first);
     return names;
   }
 
@@ -464,7 +464,8 @@ TEST_F(SelBasePropsTest, StringWordsSubstringsAndEmpty) {
 }
 
 TEST_F(SelBasePropsTest, NumbersDatesTimesBoolsAndReferences) {
-  auto range = [](SSelProps p, int i, CVXProperty low, CVXProperty high, uint32_t op = 0) {
+  auto range = [](SSelProps p, int i, const CVXProperty& low, const CVXProperty& high,
+                  uint32_t op = 0) {
     p.Conditions[i].Low = low, p.Conditions[i].High = high, p.Conditions[i].Op = op;
     return p;
   };

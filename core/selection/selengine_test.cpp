@@ -37,8 +37,9 @@ class RecordingSelEngine : public CVXSelEngine {
   // External originals: OID 0 is answered with `external` and its shape, or with `failure`.
   unsigned CreateVXFile(const SVXFileDescriptor& descriptor, CVXCatFile& file,
                         SVXDBRec_3* shape) override {
-    if (descriptor.OID != 0 || !external)
+    if (descriptor.OID != 0 || !external) {
       return CVXSelEngine::CreateVXFile(descriptor, file, shape);
+    }
     if (failure != VX_OK) return failure;
     file = *external;
     if (shape) *shape = externalShape;
@@ -277,7 +278,7 @@ TEST_F(SelEngineTest, BadInputGivesItsCode) {
   AddFiles(30, 4);
   const Events failedTail = {{State::Progress, 100}, {State::Failed, 0}, {State::Finished, 0}};
   CVXCatFile external(0, "outside.jpg", 0);
-  auto expectFailure = [&](RecordingSelEngine& run, std::vector<SVXFileDescriptor> originals,
+  auto expectFailure = [&](RecordingSelEngine& run, const std::vector<SVXFileDescriptor>& originals,
                            unsigned code) {
     ASSERT_EQ(run.InitSelection(MatchSelector(5, 0), originals), VX_OK);
     CVXResultSet result;

@@ -76,7 +76,7 @@ TEST_F(SelTempStoreTest, ChecksumIsTheOnlyTest) {
 }
 
 TEST_F(SelTempStoreTest, ShortFilesGiveCodesAndReadOnlyWritesNothing) {
-  for (std::string bytes :
+  for (const std::string& bytes :
        {std::string(), std::string("VXST"), EmptyStoreBytes(0).substr(0, 275)}) {
     vxtest::WriteFile(Path(), bytes);
     EXPECT_EQ(store_.Open(Path(), true), VX_NOT_FOUND);

@@ -203,9 +203,12 @@ CShape::CShape(const CShape& other) : CVXBase(other) {
   std::memcpy(ColorInfo, other.ColorInfo, sizeof ColorInfo);
 }
 
-CShape::CShape(CShape&& other) noexcept : CShape(static_cast<const CShape&>(other)) {
-  Scratch = std::move(other.Scratch);
-  ScratchSize = std::exchange(other.ScratchSize, 0);
+CShape::CShape(CShape&& other) noexcept
+    : CVXBase(other),
+      Scratch(std::move(other.Scratch)),
+      ScratchSize(std::exchange(other.ScratchSize, 0)) {
+  std::memcpy(&Original, &other.Original, sizeof Original);
+  std::memcpy(ColorInfo, other.ColorInfo, sizeof ColorInfo);
 }
 
 CShape& CShape::operator=(const CShape& other) {

@@ -47,8 +47,9 @@ unsigned CBlobFileLock::Acquire(const std::string& path, bool writable, bool cre
   std::lock_guard<std::mutex> guard(HeldMutex());
   struct stat st {};
   // Answer a holder in this process without opening (and later closing) a descriptor.
-  if (::stat(path.c_str(), &st) == 0 && HeldFiles().count({st.st_dev, st.st_ino}))
+  if (::stat(path.c_str(), &st) == 0 && HeldFiles().count({st.st_dev, st.st_ino})) {
     return VX_SHARING_VIOLATION;
+  }
   int flags = (writable ? O_RDWR : O_RDONLY) | O_CLOEXEC | (create ? O_CREAT : 0);
   int fd = ::open(path.c_str(), flags, 0644);
   if (fd < 0) return VX_NOT_FOUND;

@@ -233,8 +233,9 @@ unsigned CQRLBlobDB::Impl::Connect(const std::string& file, bool ro, bool create
                         : create ? CreateSchema(flags)
                                  : CheckSettings();
   if (problem.empty() && !ro &&
-      Exec("PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL") != SQLITE_OK)
+      Exec("PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL") != SQLITE_OK) {
     problem = lastError;
+  }
   if (problem.empty() && !PrepareStatements()) problem = lastError;
   if (!problem.empty()) {
     Disconnect(true);
@@ -267,8 +268,9 @@ std::string CQRLBlobDB::Impl::CheckSettings() {
   int rc;
   while ((rc = st.Step()) == SQLITE_ROW) {
     if (st.Text(0) == "format") format = st.Text(1) == kFormatName;
-    if (st.Text(0) == "version")
+    if (st.Text(0) == "version") {
       version = st.Text(2) == "integer" && st.Int64(1) >= 1 && st.Int64(1) <= kFormatVersion;
+    }
   }
   if (rc != SQLITE_DONE) return std::string("settings unreadable: ") + sqlite3_errmsg(db);
   if (!format) return "settings lack the store's format marker";
@@ -297,8 +299,9 @@ bool CQRLBlobDB::Impl::PrepareStatements() {
 // statements prepared by others on Handle() are still alive.
 bool CQRLBlobDB::Impl::Disconnect(bool force) {
   for (CSQLiteStatement* st :
-       {&get, &size, &getRange, &sizeRange, &getFrom, &set, &remove, &begin, &commit})
+       {&get, &size, &getRange, &sizeRange, &getFrom, &set, &remove, &begin, &commit}) {
     st->Finalize();
+  }
   if (!db) return true;
   if (sqlite3_close(db) != SQLITE_OK) {
     lastError = sqlite3_errmsg(db);
@@ -338,8 +341,9 @@ bool CQRLBlobDB::Impl::LoadCache(uint16_t type, SizeCache& cache) {
   CSQLiteStatement st(db, "SELECT id, length(data) FROM blobdb_records WHERE id BETWEEN ?1 AND ?2");
   st.Bind(1, FirstKey(type)).Bind(2, LastKey(type));
   int rc = st.Ok() ? SQLITE_ROW : SQLITE_ERROR;
-  while (st.Ok() && (rc = st.Step()) == SQLITE_ROW)
+  while (st.Ok() && (rc = st.Step()) == SQLITE_ROW) {
     cache.sizes[static_cast<uint32_t>(st.Int64(0))] = static_cast<unsigned>(st.Int64(1));
+  }
   cache.loaded = rc == SQLITE_DONE;
   if (!cache.loaded) {
     cache.sizes = {};
@@ -452,8 +456,9 @@ unsigned CQRLBlobDB::Impl::ReadBatch(const std::vector<SSelector>& sels, uint8_t
   uint64_t used = 0;
   return ForEachRecord(sels, get, getRange, "Get", [&](size_t i, CSQLiteStatement& st) {
     return SinkBlob(st, "Get", sels[i], [&](const uint8_t* data, size_t bytes) {
-      if (bytes > capacity - used)
+      if (bytes > capacity - used) {
         return Fail(VX_NOT_FOUND, "Get", "buffer too small at " + SelText(sels[i]));
+      }
       if (bytes) std::memcpy(out + used, data, bytes);
       used += bytes;
       return unsigned{VX_OK};
@@ -606,8 +611,10 @@ unsigned CQRLBlobDB::Set(const SSelector& sel, const void* data, unsigned size, 
   unsigned rc = s.CheckWritable("Set");
   if (rc != VX_OK) return rc;
   if (sel.Oid == 0) return s.Fail(VX_NOT_FOUND, "Set", SelText(sel) + ": OID 0");
-  if ((size && !data) || size > static_cast<unsigned>(sqlite3_limit(s.db, SQLITE_LIMIT_LENGTH, -1)))
+  if ((size && !data) ||
+      size > static_cast<unsigned>(sqlite3_limit(s.db, SQLITE_LIMIT_LENGTH, -1))) {
     return s.Fail(VX_NOT_FOUND, "Set", SelText(sel) + ": bad data or size");
+  }
   s.set.Bind(1, Key(sel)).BindBlob(2, data, size);
   s.listing = {};  // stale from now on; the memory goes back at once
   if (s.Run(s.set) != SQLITE_DONE) return s.SqlFail("Set", SelText(sel));
@@ -620,8 +627,9 @@ unsigned CQRLBlobDB::Get(const SSelector& sel, void* buffer) { return Get(sel, b
 
 unsigned CQRLBlobDB::Get(const SSelector& sel, void* buffer, unsigned capacity) {
   return impl_->ReadRecord(sel, "Get", [&](const uint8_t* data, size_t bytes) {
-    if (bytes > capacity)
+    if (bytes > capacity) {
       return impl_->Fail(VX_NOT_FOUND, "Get", SelText(sel) + ": buffer too small");
+    }
     if (bytes) std::memcpy(buffer, data, bytes);
     return unsigned{VX_OK};
   });
@@ -698,9 +706,10 @@ unsigned CQRLBlobDB::GetOids(uint16_t type, std::vector<uint32_t>& oids, bool so
   CSQLiteStatement& st = s.getRange;
   st.Bind(1, FirstKey(type)).Bind(2, LastKey(type));
   int rc;
-  while ((rc = st.Step()) == SQLITE_ROW)
+  while ((rc = st.Step()) == SQLITE_ROW) {
     listing.sizes.emplace_back(static_cast<uint32_t>(st.Int64(0)),
                                static_cast<unsigned>(st.Bytes(1)));
+  }
   st.Reset();
   if (rc != SQLITE_DONE) {
     s.lastError = sqlite3_errmsg(s.db);
@@ -741,8 +750,9 @@ unsigned CQRLBlobDB::GetAll(uint16_t type, size_t runLength, const RunSink& sink
     }
     const auto* data = static_cast<const uint8_t*>(st.Blob(1));
     size_t size = static_cast<size_t>(st.Bytes(1));
-    if (!data && size)
+    if (!data && size) {
       return s.Fail(VX_NOT_FOUND, "GetOids", std::to_string(type) + ": out of memory");
+    }
     oids.push_back(static_cast<uint32_t>(key));
     bytes.insert(bytes.end(), data, data + size);
     if (oids.size() == runLength) {
@@ -781,8 +791,9 @@ unsigned CQRLBlobDB::GetNumberOfRecords(uint16_t type, unsigned& count) {
 // Records lie in the table's b-tree in key order, and the key of one type rises with the OID;
 // after Optimize the leaf pages also follow in that order. So rising OIDs walk the file forward.
 unsigned CQRLBlobDB::OptimizeOidsForSequentialAccess(uint16_t, std::vector<uint32_t>& oids) {
-  if (!impl_->db)
+  if (!impl_->db) {
     return impl_->Fail(VX_NOT_FOUND, "OptimizeOidsForSequentialAccess", "store not open");
+  }
   // Key order is file order; lists from GetOids arrive in it already.
   if (!std::is_sorted(oids.begin(), oids.end())) std::sort(oids.begin(), oids.end());
   return VX_OK;

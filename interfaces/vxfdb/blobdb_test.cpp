@@ -134,8 +134,9 @@ TEST_F(BlobDBTest, BatchReadsAndCachesAgree) {
     sels.push_back({2, oid});
   }
   // Runs of consecutive keys take the range path; 1020 leaves a gap in the stored run.
-  for (uint32_t oid = 1001; oid <= 1030; ++oid)
+  for (uint32_t oid = 1001; oid <= 1030; ++oid) {
     ASSERT_EQ(oid == 1020 ? unsigned{VX_OK} : Put(db, {2, oid}, oid * 5 % 1700), VX_OK);
+  }
   for (uint32_t oid = 1001; oid < 1020; ++oid) sels.push_back({2, oid});
   ASSERT_EQ(Put(db, {3, 1}, 99), VX_OK);
   sels.insert(sels.begin() + 5, Sel{3, 1});
@@ -219,8 +220,9 @@ TEST_F(BlobDBTest, KilledWriterLosesNothingReported) {
     close(reports[0]);
     CQRLBlobDB db;
     if (db.Create(path_, 0) != VX_OK) _exit(1);
-    for (uint32_t oid = 1;; ++oid)
+    for (uint32_t oid = 1;; ++oid) {
       if (Put(db, {2, oid}, 1601) == VX_OK && write(reports[1], &oid, 4) != 4) _exit(2);
+    }
   }
   close(reports[1]);
   std::vector<uint32_t> done;
@@ -339,8 +341,9 @@ TEST_F(BlobDBTest, OptimizeCompactsAndKeepsRecords) {
   CQRLBlobDB db, other;
   ASSERT_EQ(db.Create(path_, 0), VX_OK);
   for (uint32_t oid = 1; oid <= 3000; ++oid) ASSERT_EQ(Put(db, {2, oid}, 1601), VX_OK);
-  for (uint32_t oid = 1; oid <= 3000; ++oid)
+  for (uint32_t oid = 1; oid <= 3000; ++oid) {
     ASSERT_EQ(oid % 3 ? db.Remove({2, oid}) : unsigned{VX_OK}, VX_OK);
+  }
   ASSERT_EQ(db.Flush(), VX_OK);
   int64_t before = db.GetFileSize();
   // The target is held by another store: it must be refused and left alone.
@@ -399,10 +402,12 @@ TEST_F(BlobDBTest, GetAllWalksATypeInRuns) {
   ASSERT_EQ(Put(db, {1, 0xFFFFFFFF}, 4), VX_OK);
   ASSERT_EQ(Put(db, {3, 1}, 4), VX_OK);
   std::string want;  // the records in the order of their keys
-  for (uint32_t oid : {40u, 2u, 9u, 10u, 11u, 500u, 7u, 0xFFFFFFFFu})
+  for (uint32_t oid : {40u, 2u, 9u, 10u, 11u, 500u, 7u, 0xFFFFFFFFu}) {
     ASSERT_EQ(Put(db, {2, oid}, oid % 700), VX_OK);
-  for (uint32_t oid : {2u, 7u, 9u, 10u, 11u, 40u, 500u, 0xFFFFFFFFu})
+  }
+  for (uint32_t oid : {2u, 7u, 9u, 10u, 11u, 40u, 500u, 0xFFFFFFFFu}) {
     want += Record(oid, oid % 700);
+  }
 
   ASSERT_EQ(collect(2, 3), VX_OK);
   EXPECT_EQ(runs, (std::vector<std::vector<uint32_t>>{{2, 7, 9}, {10, 11, 40}, {500, 0xFFFFFFFF}}));

@@ -65,8 +65,9 @@ bool Expect(std::string_view text, size_t& pos, char c) {
 bool ParseClock(std::string_view text, size_t pos, int64_t& seconds) {
   unsigned h = 0, m = 0, s = 0;
   size_t hourDigits = (pos + 1 < text.size() && text[pos + 1] != ':') ? 2 : 1;
-  if (!Digits(text, pos, hourDigits, h) || !Expect(text, pos, ':') || !Digits(text, pos, 2, m))
+  if (!Digits(text, pos, hourDigits, h) || !Expect(text, pos, ':') || !Digits(text, pos, 2, m)) {
     return false;
+  }
   if (pos < text.size() && (!Expect(text, pos, ':') || !Digits(text, pos, 2, s))) return false;
   if (pos != text.size() || h > 23 || m > 59 || s > 59) return false;
   seconds = h * 3600 + m * 60 + s;

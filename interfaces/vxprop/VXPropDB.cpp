@@ -180,9 +180,10 @@ struct CVXPropDB::Impl {
   }
 
   unsigned Fail(unsigned code, const char* op, const std::string& text) {
-    if (log)
+    if (log) {
       log->AddError(code, (std::string("CVXPropDB::") + op + ": " + text).c_str(), __LINE__,
                     __FILE__);
+    }
     return code;
   }
 

@@ -35,7 +35,7 @@ class PropDBTest : public ::testing::Test {
     EXPECT_EQ(db_.GetRecord(table, oid, row), VX_OK) << table << "/" << oid;
     return row;
   }
-  std::vector<uint32_t> Oids(uint32_t table, std::vector<CVXPropDB::SSortItem> sort = {}) {
+  std::vector<uint32_t> Oids(uint32_t table, const std::vector<CVXPropDB::SSortItem>& sort = {}) {
     std::vector<uint32_t> oids;
     EXPECT_EQ(db_.GetRecordOids(table, oids, &sort), VX_OK);
     return oids;

@@ -19,8 +19,9 @@ size_t CharBytes(std::string_view s, size_t i) {
   unsigned char hi = c == 0xED ? 0x9F : c == 0xF4 ? 0x8F : 0xBF;
   size_t n = c < 0xF0 ? 3 : 4;
   if (!IsTail(s, i + 1, lo, hi)) return 1;
-  for (size_t k = 2; k < n; ++k)
+  for (size_t k = 2; k < n; ++k) {
     if (!IsTail(s, i + k)) return 1;
+  }
   return n;
 }
 
@@ -37,8 +38,9 @@ bool IsSpace(char c) {
 }  // namespace
 
 bool IsBlank(std::string_view text) {
-  for (char c : text)
+  for (char c : text) {
     if (!IsSpace(c)) return false;
+  }
   return true;
 }
 

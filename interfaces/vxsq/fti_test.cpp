@@ -50,6 +50,7 @@ class FTITest : public ::testing::Test {
     std::vector<SFTISortItem> items;
     EXPECT_EQ(db.FTIGetSorted(tag, items, ascending, only), 0);
     std::vector<std::pair<uint32_t, std::string>> out;
+    out.reserve(items.size());
     for (const auto& i : items) out.emplace_back(i.Oid, i.Value);
     return out;
   }
@@ -83,6 +84,7 @@ TEST_F(FTITest, TagsCountFiles) {
   std::vector<SFTITag> tags;
   ASSERT_EQ(db.FTIGetTags(tags), 0);
   std::vector<std::pair<std::string, uint32_t>> got;
+  got.reserve(tags.size());
   for (const auto& t : tags) got.emplace_back(t.Tag, t.Count);
   EXPECT_EQ(got,
             (std::vector<std::pair<std::string, uint32_t>>{

@@ -50,7 +50,7 @@ class XMPDBTest : public ::testing::Test {
 };
 
 TEST_F(XMPDBTest, SetGetDeleteAndThePendingFlag) {
-  SXMPRecord in = Rec(5, std::string("<x:xmpmeta>\0\xff</x:xmpmeta>", 26), -1, "Rot");
+  SXMPRecord in = Rec(5, std::string("<x:xmpmeta>\0\xff</x:xmpmeta>", 25), -1, "Rot");
   ASSERT_EQ(db.Set(in, true), 0);
   EXPECT_TRUE(in.PendingWriteBack);
   Put(Rec(3, "other"), true);

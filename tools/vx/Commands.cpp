@@ -162,8 +162,9 @@ int InfoCommand(const std::string& path, const std::string& name, bool json) {
     w.EndObject().Key("xmp").BeginObject();
     w.Key("rating").Int(hasXmp ? xmp.Rating : 0).Key("label").String(xmp.Label);
     w.Key("packetBytes").UInt(xmp.Packet.size()).EndObject().Key("tags").BeginArray();
-    for (const SFTIRecord& t : tags)
+    for (const SFTIRecord& t : tags) {
       w.BeginObject().Key("tag").String(t.Tag).Key("value").String(t.Value).EndObject();
+    }
     w.EndArray().EndObject();
     std::cout << "\n";
     return kExitOk;
@@ -178,8 +179,9 @@ int InfoCommand(const std::string& path, const std::string& name, bool json) {
     std::printf("xmp           rating %d, label \"%s\", %zu bytes\n", xmp.Rating, xmp.Label.c_str(),
                 xmp.Packet.size());
   }
-  for (const SFTIRecord& t : tags)
+  for (const SFTIRecord& t : tags) {
     std::printf("tag           %s = %s\n", t.Tag.c_str(), t.Value.c_str());
+  }
   return kExitOk;
 }
 

@@ -50,7 +50,9 @@ HostStatus FolderWalk::Walk(const std::vector<std::string>& roots, const Visitor
     if (ec || !fs::is_directory(canonical, ec)) {
       std::string why = ec ? ec.message() : "not a directory";
       problems_.push_back({root, why});
-      if (result.ok()) result = HostStatus(HostStatus::kIoError, root + ": " + why);
+      if (result.ok()) {
+        result = HostStatus(HostStatus::kIoError, std::string(root).append(": ").append(why));
+      }
       continue;
     }
     std::vector<Pending> stack{{canonical.string(), std::string()}};

@@ -94,8 +94,9 @@ bool Search::Similar(uint32_t oid, const std::string& path, const SearchOptions&
   hits->clear();
   for (const SVXRSEntry& hit : result.Properties().Entries[0].Hits) {
     // The run cuts at whole percents.
-    if (!options.hasMinScore || hit.Score >= options.minScore)
+    if (!options.hasMinScore || hit.Score >= options.minScore) {
       hits->push_back({hit.OID, hit.Score});
+    }
   }
   return true;
 }
@@ -139,6 +140,7 @@ std::vector<std::vector<uint32_t>> Search::Group(const std::vector<SearchPair>& 
   std::map<uint32_t, std::vector<uint32_t>> groups;
   for (const auto& entry : parent) groups[Root(parent, entry.first)].push_back(entry.first);
   std::vector<std::vector<uint32_t>> out;
+  out.reserve(groups.size());
   for (auto& [root, members] : groups) out.push_back(std::move(members));
   return out;
 }

@@ -136,8 +136,9 @@ int SimilarCommand(const std::string& path, const std::string& image, const Sear
       {query, oid ? db.Thumbnail(oid) : ThumbnailOfFile(db, external), std::string()});
   vxhost::ReportGroup similar{
       "Similar images (" + std::string(Search::MethodName(options.method)) + ")", {}};
-  for (const SearchHit& hit : hits)
+  for (const SearchHit& hit : hits) {
     similar.items.push_back(Item(db, hit.oid, ScoreText(hit.score)));
+  }
   return WriteHtml(output.html, "Similar to " + query, {original, similar}) ? kExitOk
                                                                             : kExitFailure;
 }

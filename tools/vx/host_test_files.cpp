@@ -30,9 +30,11 @@ void AppendPngChunk(vxtest::Bytes& png, const char* type, const std::vector<uint
 void SaveImage(const std::string& path, int w, int h, int bands,
                uint8_t (*pixel)(int x, int y, int band), int orientation) {
   std::vector<uint8_t> buf(size_t(w) * h * bands);
-  for (int y = 0; y < h; ++y)
-    for (int x = 0; x < w; ++x)
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
       for (int b = 0; b < bands; ++b) buf[(size_t(y) * w + x) * bands + b] = pixel(x, y, b);
+    }
+  }
   vxhost::ImageDecoder::InitLibrary();
   VipsImage* img =
       vips_image_new_from_memory_copy(buf.data(), buf.size(), w, h, bands, VIPS_FORMAT_UCHAR);

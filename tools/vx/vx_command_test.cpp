@@ -85,8 +85,10 @@ class VxCommand : public ::testing::Test {
   static void SetUpTestSuite() {
     dir_ = new vxtest::TempDir;
     vxhost::ImageDecoder::InitLibrary();
-    for (const char* sub : {"photos/red", "photos/blue", "photos/yellow", "photos/odd", "outside"})
+    for (const char* sub :
+         {"photos/red", "photos/blue", "photos/yellow", "photos/odd", "outside"}) {
       fs::create_directories(P(sub));
+    }
     const std::string red = P("photos/red/red.jpg"), blue = P("photos/blue/blue.jpg");
     SaveImage(red, 640, 480, 3, RedStripes);
     WriteRichMetadata(red);
@@ -150,8 +152,9 @@ TEST_F(VxCommand, ImportSkipsBadFilesAndReimportsOnlyChanges) {
   ASSERT_EQ(imported_->exit, 0) << imported_->err;
   EXPECT_TRUE(Has(imported_->out, R"("imported":8,"updated":0,"unchanged":0,"skipped":4)"));
   // Each bad file is named with a reason; the good files of its folder are in.
-  for (const char* bad : {"corrupt.jpg", "empty.jpg", "notes.jpg", "huge.png"})
+  for (const char* bad : {"corrupt.jpg", "empty.jpg", "notes.jpg", "huge.png"}) {
     EXPECT_TRUE(Has(imported_->err, "skipped " + P("photos/odd/") + bad + ": "));
+  }
   // Not a terminal: plain lines and a summary, no carriage returns.
   EXPECT_TRUE(Has(imported_->err, "import: 12 files in"));
   EXPECT_EQ(imported_->err.find('\r'), std::string::npos);
@@ -178,8 +181,9 @@ TEST_F(VxCommand, InfoLsAndStatsShowWhatWasImported) {
   for (const char* expected :
        {R"("width":480,"height":640)", R"("format":"jpeg")", R"("Make":"Canon")",
         R"("Model":"EOS 5D")", R"("ISO":"400")", R"("DateTaken":"2021-07-04 13:45:10")",
-        R"("rating":4,"label":"Red")", R"("tag":"dc:subject","value":"Paris")"})
+        R"("rating":4,"label":"Red")", R"("tag":"dc:subject","value":"Paris")"}) {
     EXPECT_TRUE(Has(info.out, expected));
+  }
   EXPECT_EQ(info.out.find(R"("embeddedTime":null)"), std::string::npos);
   // A file without metadata has no date taken.
   Result plain = On("info", F("photos/odd/one.png") + " --json");
@@ -269,8 +273,9 @@ TEST_F(VxCommand, CategoriesByHandByFormulaAndByTag) {
   // carry each: the red family, whose derived copies kept their metadata.
   ASSERT_EQ(On("category add", " Subjects --tag dc:subject").exit, 0);
   Result tree = On("category tree");
-  for (const char* part : {"Subjects", "  = Paris (3)\n", "Alps (1)"})
+  for (const char* part : {"Subjects", "  = Paris (3)\n", "Alps (1)"}) {
     EXPECT_TRUE(Has(tree.out, part));
+  }
 }
 
 // Exit codes: 1 for a database or image that cannot be used, 2 for bad arguments, 3 for what is
@@ -326,8 +331,9 @@ TEST_F(VxCommand, HtmlReportRendersInABrowser) {
   auto* pixels = static_cast<uint8_t*>(vips_image_write_to_memory(image, &size));
   const int bands = image->Bands;
   size_t red = 0;
-  for (size_t i = 0; i + 2 < size; i += bands)
+  for (size_t i = 0; i + 2 < size; i += bands) {
     red += pixels[i] > 180 && pixels[i + 1] < 90 && pixels[i + 2] < 130;
+  }
   g_free(pixels);
   g_object_unref(image);
   EXPECT_GT(red, 2000u) << "no thumbnail of the red family in " << shot;

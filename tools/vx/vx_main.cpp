@@ -27,8 +27,9 @@ void AddSearchOptions(CLI::App* app, SearchArgs* args, bool withMax) {
       ->capture_default_str()
       ->check(CLI::IsMember({"quick", "fuzzy", "histogram", "duplicates"}));
   app->add_flag("--rotate", args->rotate, "also match the image turned by 90, 180, 270 degrees");
-  if (withMax)
+  if (withMax) {
     app->add_option("--max", args->max, "most hits to list")->check(CLI::Range(1, 32000));
+  }
   app->add_option("--min-score", args->minScore,
                   "lowest score (0 to 100); for dupes the method's tuned cut by default")
       ->check(CLI::Range(0.0, 100.0));
@@ -46,9 +47,8 @@ vx::SearchOptions ToSearchOptions(const SearchArgs& args) {
   return options;
 }
 
-}  // namespace
-
-int main(int argc, char** argv) {
+// The command line, parsed and run.
+int Run(int argc, char** argv) {
   CLI::App app{"vx: an image database on the command line"};
   app.require_subcommand(1);
   app.footer(
@@ -177,4 +177,19 @@ int main(int argc, char** argv) {
     return vx::kExitUsage;
   }
   return result;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  // A command reports its own failures; what escapes it (memory, the terminal) still ends the
+  // process with the failure code rather than an abort.
+  try {
+    return Run(argc, argv);
+  } catch (const std::exception& e) {
+    std::fprintf(stderr, "vx: %s\n", e.what());
+  } catch (...) {
+    std::fprintf(stderr, "vx: unexpected failure\n");
+  }
+  return vx::kExitFailure;
 }

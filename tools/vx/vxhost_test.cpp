@@ -74,7 +74,7 @@ auto Shape(const DecodedImage& d) {
 using Px = std::vector<uint8_t>;
 // The RGBA values of pixel `i`; throws, failing the test, when the image has fewer pixels.
 Px PixelAt(const DecodedImage& d, size_t i) {
-  d.pixels.at(i * 4 + 3);
+  (void)d.pixels.at(i * 4 + 3);
   return Px(d.pixels.begin() + i * 4, d.pixels.begin() + i * 4 + 4);
 }
 
@@ -226,8 +226,9 @@ TEST_F(HostFiles, MetadataRoundTrip) {
                                       "dc:title=Eiffel"}));
   for (const char* r : {"photoshop:City=Paris", "tiff:Make=Canon", "aux:Lens=EF50mm f/1.8",
                         "exif:DateTimeOriginal=2021-07-04T13:45:10", "exif:FNumber=2.8",
-                        "xmp:Rating=4", "xmp:Label=Red"})
+                        "xmp:Rating=4", "xmp:Label=Red"}) {
     EXPECT_NE(std::find(records.begin(), records.end(), r), records.end()) << r;
+  }
 
   // Decoding applies the orientation: the header's 640 x 480 turns upright.
   DecodedImage upright = MustDecode(path, {.maxSide = 100});
@@ -273,8 +274,9 @@ TEST(HostMetadataText, ExposureAndPercentRating) {
   };
   for (auto [seconds, text] : exposures) EXPECT_EQ(MetadataReader::ExposureText(seconds), text);
   const std::pair<int, int> stars[] = {{0, 0}, {1, 1}, {25, 2}, {50, 3}, {99, 5}};
-  for (auto [percent, n] : stars)
+  for (auto [percent, n] : stars) {
     EXPECT_EQ(MetadataReader::StarsFromPercent(percent), n) << percent;
+  }
 }
 
 TEST(HostFileCrc, MatchesZlibAcrossBlocks) {
@@ -325,8 +327,9 @@ TEST(HostFolderWalk, TreeOrderFilesLoopsAndProblems) {
   fs::create_directories(root / "b/c");
   fs::create_directories(root / "a");
   // Not candidates: a text file, and ".jpg", no name but only a dot.
-  for (const char* file : {"a/x.JPG", "a/notes.txt", "a/.jpg", "b/c/y.png", "z.heic"})
+  for (const char* file : {"a/x.JPG", "a/notes.txt", "a/.jpg", "b/c/y.png", "z.heic"}) {
     vxtest::WriteFile((root / file).string(), "12345");
+  }
   fs::create_directory_symlink(root, root / "loop");
   fs::create_symlink(root / "gone.jpg", root / "dangling.jpg");
   struct timespec times[2] = {{1000000000, 0}, {1000000000, 0}};
@@ -340,6 +343,7 @@ TEST(HostFolderWalk, TreeOrderFilesLoopsAndProblems) {
   ASSERT_EQ(walk.problems().size(), 1u);
   EXPECT_EQ(walk.problems()[0].path, "/no/such/dir");
   std::vector<std::string> order;
+  order.reserve(dirs.size());
   for (const auto& d : dirs) order.push_back(d.path);
   std::string r = root.string();
   EXPECT_EQ(order, (std::vector<std::string>{r, r + "/a", r + "/b", r + "/b/c"}));
@@ -441,10 +445,11 @@ TEST(HostProgress, CountsFromManyThreads) {
   ProgressCapture cap;
   Progress p(cap.file, "t", 40000, cap.Options(Progress::Mode::kTerminal));
   std::vector<std::thread> threads(4);
-  for (auto& t : threads)
+  for (auto& t : threads) {
     t = std::thread([&] {
       for (int i = 0; i < 10000; ++i) p.Add();
     });
+  }
   for (auto& t : threads) t.join();
   EXPECT_EQ(p.done(), 40000u);
 }
@@ -481,8 +486,9 @@ TEST(HostHtmlReport, SelfContainedEscapedPage) {
   std::string html = out.str();
   for (const char* part :
        {"<title>Dupes &lt;1&gt;</title>", "<h2>Group &amp; co</h2>",
-        "src=\"data:image/jpeg;base64,/9j/\"", "/p/a&lt;b&gt;.jpg", "no preview", "99.5"})
+        "src=\"data:image/jpeg;base64,/9j/\"", "/p/a&lt;b&gt;.jpg", "no preview", "99.5"}) {
     EXPECT_TRUE(Has(html, part));
+  }
   EXPECT_EQ(html.find("<script"), std::string::npos);
   EXPECT_EQ(html.find("http"), std::string::npos);
   EXPECT_EQ(html.substr(html.size() - 15), "</body></html>\n");
