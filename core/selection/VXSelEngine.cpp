@@ -432,12 +432,15 @@ void CVXSelEngine::AddHit_(SVXResultSetEntry& entry, size_t i, double sum) {
   if (fileFormat_.Active && fileFormat_.GrayScaleMode == 1 && greyDiffers) sum *= 0.75;
   double& c = entryCutOffs_[i];
   c = c >= 1e-6 ? std::min(c, sum / w) : sum / w;
-  if (!(c <= sum)) return;
-  entry.Hits.push_back({currentOid_, currentFile_.Properties().Folder, sum / w});
-  if (interval_ != 0 && entry.Hits.size() > limits_.MaxResults + interval_) {
-    cutOffInForce_ = true;
-    c = ResultCutOff(entry);
+  if (c <= sum) {
+    entry.Hits.push_back({currentOid_, currentFile_.Properties().Folder, sum / w});
+    if (interval_ != 0 && entry.Hits.size() > limits_.MaxResults + interval_) {
+      cutOffInForce_ = true;
+      c = ResultCutOff(entry);
+    }
   }
+  // A cut-off below the floor its block was scored with: pairs the block left out may count.
+  if (i < blockFloors_.size() && c < blockFloors_[i]) floorsBroken_ = true;
 }
 
 // ---- Scoring by blocks
@@ -451,6 +454,8 @@ void CVXSelEngine::AddHit_(SVXResultSetEntry& entry, size_t i, double sum) {
 
 void CVXSelEngine::StartBlockScoring_(CVXResultSet& result, bool needsShape) {
   scorer_.reset();
+  blockFloors_.clear();
+  floorsBroken_ = false;
   const auto& entries = result.Properties().Entries;
   if (scoringThreads_ < 2 || !needsShape || !selector_.Properties().NeedsOriginals ||
       limits_.ExactDuplicates || workers_.size() != 1 || entries.size() < kBlockScoringOriginals ||
@@ -473,13 +478,13 @@ void CVXSelEngine::ScoreBlock_(const SVXDBRec_3* shape) {
     if (it == shapeCache_.end()) break;
     block.push_back(it->second);
   }
-  // Once in force, a running cut-off only rises: Check passes no sum below it, and ResultCutOff
-  // keeps the best of hits that all reached it (scores by shapes alone never exceed 100, so it
-  // never rescales). So today's cut-offs are floors for the whole block, unless the grey-scale
-  // penalty may lower a sum after Check and with it the cut-off.
-  const bool penalty = fileFormat_.Active && fileFormat_.GrayScaleMode == 1;
-  static const std::vector<double> kNoFloors;
-  scorer_->ScoreBlock(block, cutOffInForce_ && !penalty ? entryCutOffs_ : kNoFloors);
+  // Once in force, a running cut-off only rises as a rule: Check passes no sum below it, and
+  // ResultCutOff keeps the best of hits that all reached it. So today's cut-offs serve as floors
+  // for the whole block. What can lower one (a ResultCutOff of the client's, the grey-scale
+  // penalty) is caught in AddHit_, and the run goes on without floors.
+  blockFloors_.clear();
+  if (cutOffInForce_ && !floorsBroken_) blockFloors_ = entryCutOffs_;
+  scorer_->ScoreBlock(block, blockFloors_);
   blockFirst_ = candidatePos_;
 }
 
@@ -493,7 +498,7 @@ void CVXSelEngine::ScoreFromBlock_(CVXResultSet& result, const CVXURI& uri) {
     const SVXDBRec_3* shape = GetCurrentShapeInfo();
     size_t b = candidatePos_ - blockFirst_;
     if (candidatePos_ < blockFirst_ || b >= scorer_->Candidates() ||
-        scorer_->Candidate(b) != shape) {
+        scorer_->Candidate(b) != shape || (floorsBroken_ && !blockFloors_.empty())) {
       ScoreBlock_(shape);
       b = 0;
     }

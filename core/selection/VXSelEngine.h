@@ -178,4 +178,6 @@ class CVXSelEngine : public CVXBase {
   unsigned scoringThreads_;
   std::unique_ptr<CVXSelBlockScorer> scorer_;  // only while a run scores by blocks
   size_t blockFirst_ = 0;                      // candidate position of the block's first
+  std::vector<double> blockFloors_;            // the cut-offs the block was scored with
+  bool floorsBroken_ = false;                  // a cut-off fell below its floor: no more floors
 };

@@ -46,8 +46,20 @@ class RecordingSelEngine : public CVXSelEngine {
     return VX_OK;
   }
 
+  // With keepAll the hits stay as they are and the cut-off is by turns the highest and the
+  // lowest score kept, so that the running cut-off jumps up and down.
+  double ResultCutOff(SVXResultSetEntry& entry) override {
+    if (!keepAll) return CVXSelEngine::ResultCutOff(entry);
+    const auto [low, high] = std::minmax_element(
+        entry.Hits.begin(), entry.Hits.end(),
+        [](const SVXRSEntry& a, const SVXRSEntry& b) { return a.Score < b.Score; });
+    return (highNext = !highNext) ? high->Score : low->Score;
+  }
+
   mutable Events events;
   std::function<bool(const Events&)> refuse;
+  bool keepAll = false;
+  bool highNext = false;
   const CVXCatFile* external = nullptr;
   SVXDBRec_3 externalShape{};
   unsigned failure = VX_OK;
@@ -486,6 +498,24 @@ TEST_F(SelEngineTest, RunsOverManyBanks) {
   std::vector<SVXFileDescriptor> originals;  // as few as take the way of blocks
   for (size_t i = 0; i < 31; ++i) originals.push_back({oids_[i * 3], 0, CVXURI()});
   originals.push_back({oids_[100], 0, CVXURI()});
+  auto run = [&](const CVXSelector& selector, unsigned threads, bool keepAll = false) {
+    RecordingSelEngine engine(&engine_);
+    engine.SetScoringThreads(threads);
+    engine.keepAll = keepAll;
+    EXPECT_EQ(engine.InitSelection(selector, originals), VX_OK);
+    EXPECT_TRUE(engine.Workers()[0]->ScoresByShapesAlone());
+    CVXResultSet result;
+    Outcome outcome{engine.Run(result), {}, {}};
+    for (const auto& entry : result.Properties().Entries) {
+      std::vector<std::pair<uint32_t, double>> hits;
+      for (const auto& hit : entry.Hits) hits.emplace_back(hit.OID, hit.Score);
+      outcome.entries.emplace_back(entry.Number, entry.OID, hits);
+    }
+    for (const auto& report : engine.events) {
+      if (report.first != State::Progress) outcome.reports.push_back(report);
+    }
+    return outcome;
+  };
   for (const Setting& s : settings) {
     SCOPED_TRACE(testing::Message() << "method " << s.method << " precision " << s.precision
                                     << " fast " << s.fast << " rotate " << s.rotate);
@@ -498,24 +528,7 @@ TEST_F(SelEngineTest, RunsOverManyBanks) {
           match.Weighting = s.weighting;
           limits.Mode = s.mode;
         });
-    auto run = [&](unsigned threads) {
-      RecordingSelEngine engine(&engine_);
-      engine.SetScoringThreads(threads);
-      EXPECT_EQ(engine.InitSelection(selector, originals), VX_OK);
-      EXPECT_TRUE(engine.Workers()[0]->ScoresByShapesAlone());
-      CVXResultSet result;
-      Outcome outcome{engine.Run(result), {}, {}};
-      for (const auto& entry : result.Properties().Entries) {
-        std::vector<std::pair<uint32_t, double>> hits;
-        for (const auto& hit : entry.Hits) hits.emplace_back(hit.OID, hit.Score);
-        outcome.entries.emplace_back(entry.Number, entry.OID, hits);
-      }
-      for (const auto& report : engine.events) {
-        if (report.first != State::Progress) outcome.reports.push_back(report);
-      }
-      return outcome;
-    };
-    const Outcome alone = run(1);
+    const Outcome alone = run(selector, 1);
     ASSERT_EQ(alone.code, VX_OK);
     ASSERT_EQ(alone.entries.size(), originals.size());
     EXPECT_EQ(std::get<2>(alone.entries[0]).front().first, oids_[4050]);
@@ -524,8 +537,12 @@ TEST_F(SelEngineTest, RunsOverManyBanks) {
       ASSERT_EQ(dark.size(), 1u);
       EXPECT_EQ(dark[0].first, oids_[1500]);
     }
-    EXPECT_TRUE(alone == run(3));
+    EXPECT_TRUE(alone == run(selector, 3));
   }
+  // A client's cut-off that falls back must not cost the blocks a hit: every pair scores, the
+  // cut-off comes into force after 1010 hits, and from then on follows the last hit.
+  const CVXSelector every = MatchSelector(10, 0);
+  EXPECT_TRUE(run(every, 1, true) == run(every, 3, true));
 }
 
 }  // namespace
