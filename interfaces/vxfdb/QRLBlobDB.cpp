@@ -126,15 +126,6 @@ struct CQRLBlobDB::Impl {
   bool caching = false;
   unsigned cacheKB = 0;
   std::map<uint16_t, SizeCache> sizeCaches;
-  // Sizes of the records the last GetOids listed, rising by OID: loading a type lists it and
-  // then sizes and reads it in batches, and the sizes come with the listing at no extra scan.
-  // Valid while no change has been made on the connection since (any change, through this
-  // object or past it on Handle(), rolled back or not, raises SQLite's change count).
-  struct Listing {
-    uint16_t type = 0;
-    int64_t changes = -1;
-    std::vector<std::pair<uint32_t, unsigned>> sizes;
-  } listing;
   std::string lastError;
   // Reads select (id, data) or (id, length(data)), by one key or by a range of keys; getFrom
   // walks on from a key to wherever the caller stops.
@@ -172,8 +163,6 @@ struct CQRLBlobDB::Impl {
   unsigned ReadBatch(const std::vector<SSelector>& sels, uint8_t* out, uint64_t capacity);
   unsigned SizeBatch(const std::vector<SSelector>& sels, uint64_t& total);
   unsigned RecordSize(const SSelector& sel, unsigned& bytes, const char* op);
-  bool ListingCovers(const std::vector<SSelector>& sels) const;
-  unsigned ListedSizes(const std::vector<SSelector>& sels, uint64_t& total);
 
   unsigned long SelfTestRecords(std::ostream& report, Callback callback, void* user,
                                 unsigned long total);
@@ -357,7 +346,6 @@ void CQRLBlobDB::Impl::UnloadCaches() {
     cache.loaded = false;
     cache.sizes = {};  // gives the memory back, unlike clear()
   }
-  listing = {};
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -475,7 +463,6 @@ unsigned CQRLBlobDB::Impl::SizeBatch(const std::vector<SSelector>& sels, uint64_
     return total > UINT_MAX ? Fail(VX_NOT_FOUND, "GetSize", "sum exceeds 32 bits")
                             : unsigned{VX_OK};
   };
-  if (ListingCovers(sels)) return ListedSizes(sels, total);
   if (!sels.empty() && LoadedCache(sels.front().Type)) {
     for (const SSelector& sel : sels) {
       unsigned bytes = 0;
@@ -488,29 +475,6 @@ unsigned CQRLBlobDB::Impl::SizeBatch(const std::vector<SSelector>& sels, uint64_
   return ForEachRecord(sels, size, sizeRange, "GetSize", [&](size_t, CSQLiteStatement& st) {
     return add(static_cast<unsigned>(st.Int64(1)));
   });
-}
-
-bool CQRLBlobDB::Impl::ListingCovers(const std::vector<SSelector>& sels) const {
-  if (listing.changes != sqlite3_total_changes64(db)) return false;
-  return std::all_of(sels.begin(), sels.end(),
-                     [&](const SSelector& sel) { return sel.Type == listing.type; });
-}
-
-// Sizes from the listing. Selectors usually rise by one listed record at a time, so the entry
-// behind the last hit is tried before a search; an OID the listing lacks is a missing record.
-unsigned CQRLBlobDB::Impl::ListedSizes(const std::vector<SSelector>& sels, uint64_t& total) {
-  const auto& sizes = listing.sizes;
-  auto next = sizes.begin();
-  for (const SSelector& sel : sels) {
-    if (next == sizes.end() || next->first != sel.Oid) {
-      next = std::lower_bound(sizes.begin(), sizes.end(), sel.Oid,
-                              [](const auto& entry, uint32_t oid) { return entry.first < oid; });
-      if (next == sizes.end() || next->first != sel.Oid) return VX_NOT_FOUND;
-    }
-    total += next++->second;
-    if (total > UINT_MAX) return Fail(VX_NOT_FOUND, "GetSize", "sum exceeds 32 bits");
-  }
-  return VX_OK;
 }
 
 unsigned CQRLBlobDB::Impl::RecordSize(const SSelector& sel, unsigned& bytes, const char* op) {
@@ -616,7 +580,6 @@ unsigned CQRLBlobDB::Set(const SSelector& sel, const void* data, unsigned size, 
     return s.Fail(VX_NOT_FOUND, "Set", SelText(sel) + ": bad data or size");
   }
   s.set.Bind(1, Key(sel)).BindBlob(2, data, size);
-  s.listing = {};  // stale from now on; the memory goes back at once
   if (s.Run(s.set) != SQLITE_DONE) return s.SqlFail("Set", SelText(sel));
   auto it = s.sizeCaches.find(sel.Type);
   if (it != s.sizeCaches.end() && it->second.loaded) it->second.sizes[sel.Oid] = size;
@@ -680,7 +643,6 @@ unsigned CQRLBlobDB::Remove(const SSelector& sel) {
   Impl& s = *impl_;
   unsigned rc = s.CheckWritable("Remove");
   if (rc != VX_OK) return rc;
-  s.listing = {};
   s.remove.Bind(1, Key(sel));
   if (s.Run(s.remove) != SQLITE_DONE) return s.SqlFail("Remove", SelText(sel));
   if (sqlite3_changes(s.db) == 0) return VX_NOT_FOUND;
@@ -700,30 +662,20 @@ unsigned CQRLBlobDB::GetOids(uint16_t type, std::vector<uint32_t>& oids, bool so
     return VX_OK;
   }
   // The key range comes back in key order, so this answer is always sorted.
-  Impl::Listing& listing = s.listing;
-  listing = Impl::Listing{type, -1, {}};
-  // The blob's size from the row costs less than SQL's length(), which runs a function per row.
-  CSQLiteStatement& st = s.getRange;
+  CSQLiteStatement st(s.db, "SELECT id FROM blobdb_records WHERE id BETWEEN ?1 AND ?2");
   st.Bind(1, FirstKey(type)).Bind(2, LastKey(type));
-  int rc;
-  while ((rc = st.Step()) == SQLITE_ROW) {
-    listing.sizes.emplace_back(static_cast<uint32_t>(st.Int64(0)),
-                               static_cast<unsigned>(st.Bytes(1)));
+  int rc = st.Ok() ? SQLITE_ROW : SQLITE_ERROR;
+  while (st.Ok() && (rc = st.Step()) == SQLITE_ROW) {
+    oids.push_back(static_cast<uint32_t>(st.Int64(0)));
   }
-  st.Reset();
-  if (rc != SQLITE_DONE) {
-    s.lastError = sqlite3_errmsg(s.db);
-    listing.sizes = {};
-    return s.SqlFail("GetOids", std::to_string(type));
-  }
-  listing.changes = sqlite3_total_changes64(s.db);
-  oids.reserve(listing.sizes.size());
-  for (const auto& entry : listing.sizes) oids.push_back(entry.first);
-  return VX_OK;
+  if (rc == SQLITE_DONE) return VX_OK;
+  oids.clear();
+  s.lastError = sqlite3_errmsg(s.db);
+  return s.SqlFail("GetOids", std::to_string(type));
 }
 
-// The listing scan already walks every record of the type, so it hands the bytes on as it
-// goes: a bulk load reads the type once instead of once to list it and once more in batches.
+// One scan walks every record of the type and hands the bytes on as it goes: a bulk load reads
+// the type once instead of once to list it and once more in batches.
 unsigned CQRLBlobDB::GetAll(uint16_t type, size_t runLength, const RunSink& sink) {
   Impl& s = *impl_;
   // It lists the type, and fails and logs as GetOids does.

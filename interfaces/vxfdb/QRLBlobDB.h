@@ -104,9 +104,7 @@ class CQRLBlobDB : public CVXBase {
   // 10020 when the record is missing or the store is read-only.
   unsigned Remove(const SSelector& sel);
   // All OIDs of a type; rising if `sorted`, else in any order. The vector is emptied first,
-  // and left empty on failure. The sizes of the records listed are kept (8 bytes a record) and
-  // answer GetSize of batches of that type until the next change on the connection, so that
-  // listing a type and then reading it in batches scans it twice, not three times.
+  // and left empty on failure.
   unsigned GetOids(uint16_t type, std::vector<uint32_t>& oids, bool sorted);
   // Receives runs of GetAll: OIDs and the records' bytes one behind the other, as a batch Get
   // lays them out. It may take the vectors' content (swapping in other vectors, which are

@@ -172,22 +172,6 @@ TEST_F(BlobDBTest, BatchReadsAndCachesAgree) {
   db.EnableSelectorCache(2, false);
   db.EnableCaching(false, 0);
   EXPECT_EQ(Observe(db, sels), cached);
-
-  // Sizes remembered from a listing answer the batches that follow it, and only until the
-  // next change, even one made past the store on its handle.
-  std::vector<uint32_t> listed;
-  std::vector<Sel> batch = {{2, 6}, {2, 9}, {2, 1000}, {2, 1001}};
-  unsigned sized = 0, resized = 0;
-  ASSERT_EQ(db.GetOids(2, listed, true), VX_OK);
-  EXPECT_EQ(db.GetSize(batch, sized), VX_OK);
-  EXPECT_EQ(sized, 7 + 45 + 5 + 1001 * 5 % 1700);
-  EXPECT_EQ(db.GetSize(std::vector<Sel>{{2, 9}, {2, 3}}, size), VX_NOT_FOUND);
-  ASSERT_EQ(sqlite3_exec(db.Handle(),
-                         "UPDATE blobdb_records SET data = zeroblob(1) WHERE id = (2 << 32) | 9",
-                         nullptr, nullptr, nullptr),
-            SQLITE_OK);
-  EXPECT_EQ(db.GetSize(batch, resized), VX_OK);
-  EXPECT_EQ(resized, sized - 44);
 }
 
 TEST_F(BlobDBTest, OneOpenerAtATime) {
